@@ -1,0 +1,64 @@
+// A complete set of time-zone data the device could use: the system
+// partition's, or an update unpacked below /var/db/timezone/tz/.
+#ifndef TZLINKS_DATASET_DATASET_H
+#define TZLINKS_DATASET_DATASET_H
+
+#include "dataset/dataset_component.h"
+#include "support/version.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+using velm_component_list = std::vector<std::shared_ptr<velm_dataset_component>>;
+
+class velm_dataset {
+  public:
+    // The system partition's dataset.
+    velm_dataset();
+    // The dataset rooted at root; an empty root also means the system
+    // partition. Throws invalid_argument("badpath") for a non-empty root
+    // that is not below /var/db/timezone/tz/.
+    explicit velm_dataset(const std::string& root);
+
+    velm_dataset(const velm_dataset&) = delete;
+    velm_dataset& operator=(const velm_dataset&) = delete;
+
+    // Whether every component of this dataset can stand in for the one at
+    // the same position in other.
+    bool compatible(const velm_dataset& other) const;
+    // Newer by version; nothing else is compared.
+    bool operator>(const velm_dataset& other) const;
+    // Same root path.
+    bool operator==(const velm_dataset& other) const;
+    // Activates every component in order; the first failure propagates.
+    void activate() const;
+
+    std::string get_version_string() const { return version_string; }
+    const velm_version& get_version() const { return version; }
+    const velm_component_list& get_components() const { return components; }
+
+  private:
+    void create_components();
+
+    velm_version version;
+    std::string version_string;
+    std::string root_path;
+    velm_component_list components; // zoneinfo, then ICU
+};
+
+// Pairwise compatible_schema over two lists, stopping at the first "no";
+// lists of different lengths are never compatible.
+bool compatible_components(const velm_component_list& mine, const velm_component_list& theirs);
+
+// Makes the system partition's dataset live.
+void force_system_dataset();
+// The root named by /var/db/timezone/zoneinfo; "" for the system partition.
+std::string current_dataset_path();
+// The target of /var/db/timezone/tz_latest, unchecked; "" when absent.
+std::string latest_dataset_path();
+// Turns a zoneinfo link target back into a dataset root. Warns and throws
+// -1 for a target that names neither an update nor the system partition.
+std::string dataset_path_from_zoneinfo_link(const std::string& target);
+
+#endif

@@ -1,0 +1,32 @@
+// The ICU time-zone data of a dataset. Two ICU components are
+// interchangeable only when their schemas (format tags such as 44l) match.
+#ifndef TZLINKS_DATASET_ICU_H
+#define TZLINKS_DATASET_ICU_H
+
+#include "dataset/dataset_component.h"
+
+#include <string>
+
+class velm_icu final : public velm_dataset_component {
+  public:
+    velm_icu();
+    explicit velm_icu(const std::string& root);
+
+    // True when other is an ICU component with the very same schema.
+    bool compatible_schema(const velm_dataset_component& other) const override;
+    // Clears both ICU links, then points /var/db/timezone/icutz at
+    // data_dir for an update; the system partition's data needs no link.
+    void activate() const override;
+
+    const std::string& get_schema() const { return schema; }
+    const std::string& get_data_dir() const { return data_dir; }
+
+  private:
+    void initialize();
+    void find_update_schema();
+
+    std::string schema;
+    std::string data_dir;
+};
+
+#endif

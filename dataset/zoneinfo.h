@@ -1,0 +1,32 @@
+// The compiled tz database of a dataset.
+#ifndef TZLINKS_DATASET_ZONEINFO_H
+#define TZLINKS_DATASET_ZONEINFO_H
+
+#include "dataset/dataset_component.h"
+
+#include <string>
+
+class velm_zoneinfo final : public velm_dataset_component {
+  public:
+    velm_zoneinfo();
+    explicit velm_zoneinfo(const std::string& root);
+
+    // Any tz database can replace any other.
+    bool compatible_schema(const velm_dataset_component& other) const override;
+    // Points /var/db/timezone/zoneinfo at data_dir.
+    void activate() const override;
+
+    // First word of data_dir/+VERSION; empty when there is none.
+    std::string get_version_text() const { return version_text; }
+    const std::string& get_data_dir() const { return data_dir; }
+
+  private:
+    void read_version();
+
+    // Also the exact target of the live link, which is how the dataset
+    // root is later recovered from that link.
+    std::string data_dir;
+    std::string version_text;
+};
+
+#endif
