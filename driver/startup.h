@@ -1,0 +1,14 @@
+#ifndef TZLINKS_DRIVER_STARTUP_H
+#define TZLINKS_DRIVER_STARTUP_H
+
+// Exit status when even the last-resort reset fails and errno cannot serve
+// as the status (0, or above 255). Not an errno value on any platform this
+// tool runs on, so it is never mistaken for one.
+const int last_resort_unknown_status = 255;
+
+// One whole run of the tool. Returns 0 whenever the run reaches its end;
+// when the last-resort reset fails the process exits from inside with errno
+// (or last_resort_unknown_status) and this does not return.
+int run_startup_sequence();
+
+#endif
