@@ -7,6 +7,7 @@
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 static std::string refusal = "the sandbox was never entered";
@@ -97,34 +98,21 @@ sandbox_test::TearDown()
     umount2("/var", MNT_DETACH);
 }
 
-static void
-make_parents(const std::string& path)
-{
-    for (size_t slash = path.find('/', 1); slash != std::string::npos;
-         slash = path.find('/', slash + 1))
-        mkdir(path.substr(0, slash).c_str(), 0755);
-}
-
 void
-put_dir(const std::string& path, mode_t mode)
+build_tree(const std::string& commands)
 {
-    make_parents(path + "/");
-    ASSERT_EQ(chmod(path.c_str(), mode), 0) << path;
-}
-
-void
-put_file(const std::string& path, const std::string& content, mode_t mode)
-{
-    make_parents(path);
-    std::ofstream(path, std::ios::binary | std::ios::trunc) << content;
-    ASSERT_EQ(chmod(path.c_str(), mode), 0) << path;
-}
-
-void
-put_link(const std::string& target, const std::string& path)
-{
-    make_parents(path);
-    ASSERT_EQ(symlink(target.c_str(), path.c_str()), 0) << path << " -> " << target;
+    if (commands.empty())
+        return;
+    std::string script =
+        std::string(". '") + TZLINKS_SOURCE_DIR "/tools/sample-tree.sh'; " + commands;
+    pid_t child = fork();
+    if (child == 0) {
+        execl("/bin/sh", "sh", "-euc", script.c_str(), static_cast<char*>(nullptr));
+        _exit(127);
+    }
+    int status = -1;
+    waitpid(child, &status, 0);
+    ASSERT_EQ(status, 0) << "tree commands failed: " << commands;
 }
 
 std::string
