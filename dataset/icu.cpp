@@ -17,8 +17,7 @@ static const char legacy_icu_link[] = "/var/db/icutz";
 velm_icu::velm_icu() : velm_icu(std::string()) {}
 
 velm_icu::velm_icu(const std::string& root)
-    : velm_dataset_component(root),
-      data_dir(root.empty() ? system_icu_dir : root + "/icutz")
+    : velm_dataset_component(root), data_dir(root.empty() ? system_icu_dir : root + "/icutz")
 {
     initialize();
 }

@@ -5,9 +5,10 @@
 
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <stdexcept>
 #include <string>
-#include <typeinfo>
+#include <vector>
 
 struct outcome {
     std::string err;    // everything written to standard error
@@ -34,5 +35,28 @@ observe(F&& call)
     result.err = testing::internal::GetCapturedStderr();
     return result;
 }
+
+// One expected warning: the message and the errno whose text follows it.
+struct warned {
+    std::string message;
+    int errnum;
+};
+
+// A row of the in-process tables: build a tree, call something, compare
+// what it returned, wrote and threw, and what the tree holds afterwards.
+struct call_row {
+    std::string name;
+    std::string tree; // sample-tree commands (see tools/sample-tree.sh)
+    std::function<std::string()> call;
+    std::string result;
+    std::vector<warned> warnings;
+    std::string thrown;
+    std::string path = ""; // an entry to describe afterwards, if any
+    std::string after = "";
+};
+
+void PrintTo(const call_row& row, std::ostream* os);
+// Runs the row in the sandbox and checks every expectation.
+void check_call_row(const call_row& row);
 
 #endif

@@ -7,6 +7,7 @@
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 static std::string refusal = "the sandbox was never entered";
@@ -95,6 +96,23 @@ sandbox_test::TearDown()
         return;
     umount2("/usr/share", MNT_DETACH);
     umount2("/var", MNT_DETACH);
+}
+
+void
+build_tree(const std::string& commands)
+{
+    if (commands.empty())
+        return;
+    std::string script =
+        std::string(". '") + TZLINKS_SOURCE_DIR "/tools/sample-tree.sh'; " + commands;
+    pid_t child = fork();
+    if (child == 0) {
+        execl("/bin/sh", "sh", "-euc", script.c_str(), static_cast<char*>(nullptr));
+        _exit(127);
+    }
+    int status = -1;
+    waitpid(child, &status, 0);
+    ASSERT_EQ(status, 0) << "tree commands failed: " << commands;
 }
 
 static void

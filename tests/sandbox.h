@@ -27,6 +27,9 @@ class sandbox_test : public ::testing::Test {
     bool mounted = false;
 };
 
+// Runs sample-tree commands (tools/sample-tree.sh) against the fixed paths.
+void build_tree(const std::string& commands);
+
 // Tree building; parent directories are created as needed.
 void put_dir(const std::string& path, mode_t mode = 0755);
 void put_file(const std::string& path, const std::string& content, mode_t mode = 0644);

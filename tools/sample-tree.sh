@@ -1,6 +1,7 @@
 # Builders for sample device trees, sourced by the demo, the benchmark, the
 # fault runs and the end-to-end tests. Every path is taken below $TREE
 # (empty: the real fixed paths, as inside the sandbox).
+: "${TREE:=}"
 #
 #   system_dataset 2023c 44l       tz database 2023c and ICU schema 44l on
 #                                  the system partition
