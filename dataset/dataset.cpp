@@ -8,7 +8,8 @@
 #include <err.h>
 #include <stdexcept>
 
-static const std::string update_prefix = "/var/db/timezone/tz/";
+// Built before main, where a failed allocation can only end the process.
+static const std::string update_prefix = "/var/db/timezone/tz/"; // NOLINT(cert-err58-cpp)
 
 velm_dataset::velm_dataset()
 {

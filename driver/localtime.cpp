@@ -7,8 +7,11 @@
 #include <err.h>
 
 static const char localtime_link[] = "/var/db/timezone/localtime";
+// Built before main, where a failed allocation can only end the process.
+// NOLINTBEGIN(cert-err58-cpp)
 static const std::string live_prefix = "/var/db/timezone/zoneinfo";
 static const std::string legacy_prefix = "/usr/share/zoneinfo";
+// NOLINTEND(cert-err58-cpp)
 static const char default_zone[] = "America/Los_Angeles";
 static const char default_target[] = "/var/db/timezone/zoneinfo/America/Los_Angeles";
 
