@@ -115,36 +115,6 @@ build_tree(const std::string& commands)
     ASSERT_EQ(status, 0) << "tree commands failed: " << commands;
 }
 
-static void
-make_parents(const std::string& path)
-{
-    for (size_t slash = path.find('/', 1); slash != std::string::npos;
-         slash = path.find('/', slash + 1))
-        mkdir(path.substr(0, slash).c_str(), 0755);
-}
-
-void
-put_dir(const std::string& path, mode_t mode)
-{
-    make_parents(path + "/");
-    ASSERT_EQ(chmod(path.c_str(), mode), 0) << path;
-}
-
-void
-put_file(const std::string& path, const std::string& content, mode_t mode)
-{
-    make_parents(path);
-    std::ofstream(path, std::ios::binary | std::ios::trunc) << content;
-    ASSERT_EQ(chmod(path.c_str(), mode), 0) << path;
-}
-
-void
-put_link(const std::string& target, const std::string& path)
-{
-    make_parents(path);
-    ASSERT_EQ(symlink(target.c_str(), path.c_str()), 0) << path << " -> " << target;
-}
-
 std::string
 describe(const std::string& path)
 {

@@ -30,11 +30,6 @@ class sandbox_test : public ::testing::Test {
 // Runs sample-tree commands (tools/sample-tree.sh) against the fixed paths.
 void build_tree(const std::string& commands);
 
-// Tree building; parent directories are created as needed.
-void put_dir(const std::string& path, mode_t mode = 0755);
-void put_file(const std::string& path, const std::string& content, mode_t mode = 0644);
-void put_link(const std::string& target, const std::string& path);
-
 // What stands at path, in one comparable word: "-> target" for a link,
 // "file:content" for a file, "dir" or "absent".
 std::string describe(const std::string& path);

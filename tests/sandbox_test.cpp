@@ -11,8 +11,7 @@ namespace {
 TEST_F(sandbox_test, writes_under_fixed_paths_stay_private)
 {
     std::string name = "tzlinks-sandbox-probe-" + std::to_string(getpid());
-    put_file("/var/db/timezone/" + name, "probe");
-    put_link("/usr/share/zoneinfo.default", "/var/db/timezone/zoneinfo");
+    build_tree("put_file /var/db/timezone/" + name + " probe");
     EXPECT_EQ(describe("/var/db/timezone/" + name), "file:probe");
 
     struct stat host, sandbox;

@@ -1,17 +1,18 @@
 # Builders for sample device trees, sourced by the demo, the benchmark, the
 # fault runs and the end-to-end tests. Every path is taken below $TREE
 # (empty: the real fixed paths, as inside the sandbox).
-: "${TREE:=}"
 #
 #   system_dataset 2023c 44l       tz database 2023c and ICU schema 44l on
 #                                  the system partition
 #   update_dataset 2024a.1.0 44l   an unpacked update below /var/db/timezone/tz
 #   put_link TARGET PATH           a symbolic link, parents created
-#   put_file PATH TEXT             a file holding TEXT, parents created
+#   put_file PATH TEXT             a file holding TEXT (printf %b escapes:
+#                                  \n, \t, \0NNN), parents created
+: "${TREE:=}"
 
 put_file() {
     mkdir -p "$TREE$(dirname "$1")"
-    printf '%s' "$2" >"$TREE$1"
+    printf '%b' "$2" >"$TREE$1"
 }
 
 put_link() {
@@ -40,4 +41,26 @@ update_dataset() {
 "
     put_zones "$root/zoneinfo"
     put_file "$root/icutz/icutz$2.dat" "icu-data"
+}
+
+# Shortcuts for whole device states (links of the live dataset and a
+# localtime link to Europe/Paris; the system dataset must exist).
+tz=/var/db/timezone
+
+live_system() {
+    put_link /usr/share/zoneinfo.default $tz/zoneinfo
+    put_link $tz/zoneinfo/Europe/Paris $tz/localtime
+}
+
+# live_update NAME [SCHEMA]: the update NAME exists and is live.
+live_update() {
+    update_dataset "$1" "${2:-44l}"
+    put_link $tz/tz/$1/zoneinfo $tz/zoneinfo
+    put_link $tz/tz/$1/icutz $tz/icutz
+    put_link $tz/zoneinfo/Europe/Paris $tz/localtime
+}
+
+# latest NAME: tz_latest names the update NAME (which need not exist).
+latest() {
+    put_link $tz/tz/$1 $tz/tz_latest
 }
