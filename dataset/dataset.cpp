@@ -8,7 +8,8 @@
 #include <err.h>
 #include <stdexcept>
 
-static const std::string update_prefix = "/var/db/timezone/tz/";
+static const char update_prefix[] = "/var/db/timezone/tz/";
+static const size_t update_prefix_length = sizeof update_prefix - 1;
 
 velm_dataset::velm_dataset()
 {
@@ -28,8 +29,8 @@ velm_dataset::create_components()
     auto zoneinfo = std::make_shared<velm_zoneinfo>(root_path);
     if (root_path.empty()) {
         version_string = zoneinfo->get_version_text() + ".1.0";
-    } else if (root_path.size() > update_prefix.size() && has_prefix(root_path, update_prefix)) {
-        version_string = root_path.substr(update_prefix.size());
+    } else if (root_path.size() > update_prefix_length && has_prefix(root_path, update_prefix)) {
+        version_string = root_path.substr(update_prefix_length);
     } else {
         warn("velm_dataset::create_components: bad path %s", root_path.c_str());
         throw std::invalid_argument("badpath");
@@ -99,9 +100,9 @@ current_dataset_path()
 std::string
 dataset_path_from_zoneinfo_link(const std::string& target)
 {
-    if (target.size() > update_prefix.size() && has_prefix(target, update_prefix)) {
+    if (target.size() > update_prefix_length && has_prefix(target, update_prefix)) {
         size_t last_slash = target.rfind('/');
-        if (last_slash > update_prefix.size())
+        if (last_slash > update_prefix_length)
             return target.substr(0, last_slash);
     } else if (target == "/usr/share/zoneinfo.default") {
         return std::string();

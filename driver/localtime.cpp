@@ -7,8 +7,8 @@
 #include <err.h>
 
 static const char localtime_link[] = "/var/db/timezone/localtime";
-static const std::string live_prefix = "/var/db/timezone/zoneinfo";
-static const std::string legacy_prefix = "/usr/share/zoneinfo";
+static const char live_prefix[] = "/var/db/timezone/zoneinfo";
+static const char legacy_prefix[] = "/usr/share/zoneinfo";
 static const char default_zone[] = "America/Los_Angeles";
 static const char default_target[] = "/var/db/timezone/zoneinfo/America/Los_Angeles";
 
@@ -23,7 +23,7 @@ keep_or_rewrite_localtime()
             return true;
         if (!has_prefix(target, legacy_prefix))
             return false;
-        std::string corrected = live_prefix + target.substr(legacy_prefix.size());
+        std::string corrected = live_prefix + target.substr(sizeof legacy_prefix - 1);
         warn("Correcting localtime link to %s", corrected.c_str());
         if (!velm_fs::path_exists(corrected))
             return false;

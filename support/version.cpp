@@ -26,8 +26,13 @@ void
 velm_version_parse(velm_version& version, const std::string& text)
 {
     // Compiled on every call: a run parses one text per dataset it builds.
+    // The system's +VERSION word has no length limit, and the default
+    // backtracking matcher recurses once per character: a damaged file of a
+    // few tens of kilobytes would overflow the stack. The library's
+    // breadth-first matcher finds the same whole match in constant stack,
+    // and the pattern is unambiguous, so the groups come out the same.
     const std::regex pattern("([0-9]+)([a-z]+)(?:\\.([0-9]+))?(?:\\.([0-9]+))?",
-                             std::regex::ECMAScript);
+                             std::regex::ECMAScript | std::regex_constants::__polynomial);
     std::smatch results;
     try {
         if (!std::regex_match(text, results, pattern) || results.size() != 5) {
