@@ -23,7 +23,8 @@ static std::vector<std::string>
 command_words()
 {
     std::vector<std::string> words;
-    std::istringstream runner(getenv("TZLINKS_RUNNER") ? getenv("TZLINKS_RUNNER") : "");
+    const char* runner_words = getenv("TZLINKS_RUNNER");
+    std::istringstream runner(runner_words ? runner_words : "");
     for (std::string word; runner >> word;)
         words.push_back(word);
     words.push_back(TZLINKS_BINARY);
