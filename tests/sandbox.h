@@ -1,41 +1,36 @@
-// A private user and mount namespace in which fresh, empty directories hide
-// the host's /var and /usr/share, so that the tool's fixed paths can be
-// exercised without touching the machine the tests run on.
+// The tests' private world: a user and mount namespace in which empty tmpfs
+// mounts hide the host's /var and /usr/share, so that programs working on
+// the tool's fixed paths run for real without touching the host.
 #ifndef TZLINKS_TESTS_SANDBOX_H
 #define TZLINKS_TESTS_SANDBOX_H
 
-#include <gtest/gtest.h>
-
+#include <map>
 #include <string>
-#include <sys/types.h>
+#include <vector>
 
-// Called once from main, before anything could start a thread.
-void enter_sandbox();
-// Why the sandbox could not be entered; empty when it was.
-const std::string& sandbox_refusal();
-// A descriptor of the host's /var as it was before the sandbox hid it.
-int host_var_fd();
+// Enters the namespace; returns why it could not, or "". Must run before
+// anything starts a thread.
+std::string enter_sandbox();
+// What enter_sandbox returned: tests that need the sandbox skip with it.
+extern std::string sandbox_refused;
+// Puts empty file systems over /var and /usr/share; false when refused.
+bool fresh_tree();
+// Runs the sample-tree builders (tools/sample-tree.sh) on the fixed paths.
+bool build_tree(const std::string& commands);
 
-// Every test of this fixture starts from an empty /var and /usr/share, or
-// is skipped with the reason when namespaces are refused.
-class sandbox_test : public ::testing::Test {
-  protected:
-    void SetUp() override;
-    void TearDown() override;
-
-  private:
-    bool mounted = false;
+struct outcome {
+    int status; // exit status, or 128 + the signal that ended it
+    std::string out, err;
 };
+// Runs a program, killed after a second (a minute under $TZLINKS_RUNNER).
+outcome run(std::vector<std::string> argv);
+// The words that start a program of the project: those of $TZLINKS_RUNNER
+// (an emulator, or valgrind), then the program's path.
+std::vector<std::string> program(const std::string& path);
 
-// Runs sample-tree commands (tools/sample-tree.sh) against the fixed paths.
-void build_tree(const std::string& commands);
-
-// What stands at path, in one comparable word: "-> target" for a link,
-// "file:content" for a file, "dir" or "absent".
-std::string describe(const std::string& path);
-
-// What the tool's warn(3) writes for message with errno errnum, for a
-// program called prog (the running test binary by default).
-std::string warning(const std::string& message, int errnum, const std::string& prog = "");
+// Every entry below /var and /usr/share, by path: "->target" for a link,
+// "=content" for a file, "/" for a directory, "|" for anything else; with
+// change times, so that even a rewrite with the same content shows.
+std::map<std::string, std::string> snapshot(bool with_times = false);
 
 #endif

@@ -8,6 +8,9 @@
 #   put_link TARGET PATH           a symbolic link, parents created
 #   put_file PATH TEXT             a file holding TEXT (printf %b escapes:
 #                                  \n, \t, \0NNN), parents created
+#   relink NAME TARGET             /var/db/timezone/NAME, whatever it was,
+#                                  replaced by a link to TARGET
+#   repeat N C                     prints the character C N times
 : "${TREE:=}"
 
 put_file() {
@@ -18,6 +21,15 @@ put_file() {
 put_link() {
     mkdir -p "$TREE$(dirname "$2")"
     ln -s "$1" "$TREE$2"
+}
+
+relink() {
+    rm -rf "$TREE/var/db/timezone/$1"
+    put_link "$2" "/var/db/timezone/$1"
+}
+
+repeat() {
+    head -c "$1" /dev/zero | tr '\0' "$2"
 }
 
 # A few zone files, so that localtime links have something to point at.
