@@ -2,13 +2,14 @@
 
 #include "dataset/first_word.h"
 #include "support/fs.h"
+#include "support/prefix.h"
 
 #include <cerrno>
-#include <cstring>
+#include <dirent.h>
 #include <err.h>
-#include <fts.h>
-#include <regex>
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 static const char system_icu_dir[] = "/usr/share/icu";
 static const char icu_link[] = "/var/db/timezone/icutz";
@@ -31,40 +32,59 @@ velm_icu::initialize()
         find_update_schema();
 }
 
-// Only a readable regular file directly inside data_dir counts; anything
-// else the walk returns (the root itself, deeper entries, links, entries
-// that could not be stat'ed) is passed over.
-static bool
-is_candidate(const FTSENT* entry)
+std::string
+velm_icu_schema_in_name(const std::string& name)
 {
-    return entry->fts_errno == 0 && entry->fts_level == 1 && entry->fts_namelen != 0 &&
-           entry->fts_info == FTS_F && (entry->fts_statp->st_mode & S_IROTH) != 0;
+    static const size_t digits = sizeof "icutz" - 1;
+    size_t letter = digits;
+    while (letter < name.size() && name[letter] >= '0' && name[letter] <= '9')
+        ++letter;
+    if (!has_prefix(name, "icutz") || letter == digits || letter >= name.size() ||
+        (name[letter] != 'l' && name[letter] != 'b' && name[letter] != 'e') ||
+        name.compare(letter + 1, std::string::npos, ".dat") != 0)
+        return std::string();
+    return name.substr(digits, letter + 1 - digits);
+}
+
+// Only a regular file directly inside the directory, readable by others,
+// counts; links, directories and whatever lies deeper do not. The first
+// match in directory order wins.
+static std::string
+first_schema_in(int directory)
+{
+    alignas(struct dirent64) char buffer[8192];
+    for (ssize_t n; (n = getdents64(directory, buffer, sizeof buffer)) > 0;) {
+        for (ssize_t at = 0; at < n;) {
+            const auto* entry = reinterpret_cast<const struct dirent64*>(buffer + at);
+            at += entry->d_reclen;
+            std::string schema = velm_icu_schema_in_name(entry->d_name);
+            struct stat st;
+            if (!schema.empty() &&
+                fstatat(directory, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) == 0 &&
+                S_ISREG(st.st_mode) && (st.st_mode & S_IROTH) != 0)
+                return schema;
+        }
+    }
+    return std::string();
 }
 
 // An update's schema is spelled in the name of its data file, for example
-// icutz44l.dat. The first match in directory order wins.
+// icutz44l.dat. A missing or unreadable directory holds none.
 void
 velm_icu::find_update_schema()
 {
-    const std::regex pattern("icutz([0-9]+[lbe])\\.dat", std::regex::ECMAScript);
-    char* roots[] = {const_cast<char*>(data_dir.c_str()), nullptr};
-    FTS* walk = fts_open(roots, FTS_COMFOLLOW | FTS_PHYSICAL | FTS_XDEV, nullptr);
-    if (walk == nullptr) {
-        warn("tz_icu::initialize: fts_open of %s failed, %s", data_dir.c_str(), strerror(errno));
-        throw errno;
+    int directory = system_calls().open_for_reading(data_dir.c_str(), O_DIRECTORY);
+    if (directory >= 0) {
+        schema = first_schema_in(directory);
+        (void)close(directory);
     }
-    while (const FTSENT* entry = fts_read(walk)) {
-        if (!schema.empty())
-            break;
-        if (!is_candidate(entry))
-            continue;
-        std::cmatch match;
-        if (std::regex_match(entry->fts_name, match, pattern) && match.size() == 2)
-            schema = match[1].str();
-    }
-    fts_close(walk);
-    if (schema.empty())
+    if (schema.empty()) {
+        // A walk that finds nothing ends with errno at 0, as it always
+        // has: this warning, and those after it that follow no failed
+        // call, carry that text.
+        errno = 0;
         warn("No ICU schema found for %s", root_path.c_str());
+    }
 }
 
 bool

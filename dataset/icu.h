@@ -7,6 +7,11 @@
 
 #include <string>
 
+// The schema an update's ICU data file spells in its name: for a name that
+// is icutz<digits><l, b or e>.dat as a whole, the part between icutz and
+// .dat; for any other name, the empty string.
+std::string velm_icu_schema_in_name(const std::string& name);
+
 class velm_icu final : public velm_dataset_component {
   public:
     velm_icu();

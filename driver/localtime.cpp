@@ -3,7 +3,6 @@
 #include "support/fs.h"
 #include "support/prefix.h"
 
-#include <cstdio>
 #include <err.h>
 
 static const char localtime_link[] = "/var/db/timezone/localtime";
@@ -27,7 +26,7 @@ keep_or_rewrite_localtime()
         warn("Correcting localtime link to %s", corrected.c_str());
         if (!velm_fs::path_exists(corrected))
             return false;
-        (void)std::remove(localtime_link);
+        (void)system_calls().remove(localtime_link);
         velm_fs::create_symlink(corrected, localtime_link);
         return true;
     } catch (...) {
@@ -41,6 +40,6 @@ correct_localtime_symlink()
     if (keep_or_rewrite_localtime())
         return;
     warn("localtime link invalid; resetting to %s", default_zone);
-    (void)std::remove(localtime_link);
+    (void)system_calls().remove(localtime_link);
     velm_fs::create_symlink(default_target, localtime_link);
 }

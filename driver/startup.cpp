@@ -4,11 +4,10 @@
 #include "driver/housekeeping.h"
 #include "driver/localtime.h"
 
+#include "support/fs.h"
+
 #include <cerrno>
-#include <cstdio>
-#include <cstdlib>
 #include <err.h>
-#include <fstream>
 
 static const char version_diff_record[] = "/var/db/timezone/TZVersionDiffRecord";
 
@@ -18,9 +17,7 @@ static const char version_diff_record[] = "/var/db/timezone/TZVersionDiffRecord"
 static void
 write_version_diff_record(const std::string& before, const std::string& adopted)
 {
-    std::ofstream record(version_diff_record, std::ios::out | std::ios::trunc);
-    record << before << '_' << adopted;
-    record.close();
+    (void)system_calls().write_file(version_diff_record, before + "_" + adopted);
 }
 
 // Reads the zoneinfo link; a link that is missing or not understood puts
@@ -72,8 +69,14 @@ int
 run_startup_sequence()
 {
     protect_data_directories();
+    return relink_time_zone_data();
+}
+
+int
+relink_time_zone_data()
+{
     migrate_icu_link();
-    (void)std::remove("/var/db/icu");
+    (void)system_calls().remove("/var/db/icu");
 
     try {
         decide();
@@ -83,10 +86,11 @@ run_startup_sequence()
             force_system_dataset();
         } catch (...) {
             warn("Last resort force_system_dataset() failed");
-            // Without working links there is nothing sensible left to do;
-            // errno is the only account of why.
+            // Without working links there is nothing sensible left to do,
+            // not even the localtime repair; errno is the only account of
+            // why.
             int status = errno;
-            std::exit(status >= 1 && status <= 255 ? status : last_resort_unknown_status);
+            return status >= 1 && status <= 255 ? status : last_resort_unknown_status;
         }
     }
 

@@ -6,9 +6,12 @@
 // tool runs on, so it is never mistaken for one.
 const int last_resort_unknown_status = 255;
 
-// One whole run of the tool. Returns 0 whenever the run reaches its end;
-// when the last-resort reset fails the process exits from inside with errno
-// (or last_resort_unknown_status) and this does not return.
+// One whole run of the tool; returns the exit status: 0 whenever the run
+// reaches its end, errno (or last_resort_unknown_status) when even the
+// last-resort reset fails, and the run stops there.
 int run_startup_sequence();
+// The same run without the directory protection, which changes no link:
+// what tzlinks-status runs against its simulation of the file system.
+int relink_time_zone_data();
 
 #endif

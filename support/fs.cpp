@@ -1,15 +1,90 @@
 #include "support/fs.h"
 
 #include <cerrno>
+#include <cstdio>
 #include <err.h>
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
+
+int
+velm_system_calls::unlink(const char* path) const
+{
+    return ::unlink(path);
+}
+
+int
+velm_system_calls::access(const char* path) const
+{
+    return ::access(path, F_OK);
+}
+
+ssize_t
+velm_system_calls::readlink(const char* path, char* buffer, size_t size) const
+{
+    return ::readlink(path, buffer, size);
+}
+
+int
+velm_system_calls::symlink(const char* target, const char* path) const
+{
+    return ::symlink(target, path);
+}
+
+int
+velm_system_calls::remove(const char* path) const
+{
+    return std::remove(path);
+}
+
+int
+velm_system_calls::open_for_reading(const char* path, int flags) const
+{
+    // A FIFO opened without O_NONBLOCK waits for a writer, for ever at boot.
+    return ::open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | flags);
+}
+
+int
+velm_system_calls::write_file(const char* path, const std::string& text) const
+{
+    // Not through a link, which could aim the write at any file of the
+    // system, and not into a FIFO or a device: O_NONBLOCK makes a FIFO
+    // without a reader fail at once, and fstat tells the rest.
+    int fd = ::open(path, O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0666);
+    if (fd < 0)
+        return -1;
+    struct stat st;
+    int result = fstat(fd, &st) == 0 && S_ISREG(st.st_mode) ? 0 : -1;
+    for (size_t done = 0; result == 0 && done < text.size();) {
+        ssize_t n = ::write(fd, text.data() + done, text.size() - done);
+        result = n > 0 ? 0 : -1;
+        done += n > 0 ? static_cast<size_t>(n) : 0;
+    }
+    (void)::close(fd);
+    return result;
+}
+
+static const velm_system_calls real_calls{};
+static const velm_system_calls* calls_in_use = &real_calls;
+
+const velm_system_calls&
+system_calls()
+{
+    return *calls_in_use;
+}
+
+void
+use_system_calls(const velm_system_calls& calls)
+{
+    calls_in_use = &calls;
+}
 
 namespace velm_fs {
 
 void
 remove(const std::string& path)
 {
-    if (unlink(path.c_str()) == 0 || errno == ENOENT)
+    if (system_calls().unlink(path.c_str()) == 0 || errno == ENOENT)
         return;
     warn("remove: could not remove %s", path.c_str());
     throw errno;
@@ -18,14 +93,14 @@ remove(const std::string& path)
 bool
 path_exists(const std::string& path)
 {
-    return access(path.c_str(), F_OK) == 0;
+    return system_calls().access(path.c_str()) == 0;
 }
 
 std::string
 read_symlink(const std::string& path)
 {
     char buffer[1025];
-    ssize_t n = readlink(path.c_str(), buffer, 1024);
+    ssize_t n = system_calls().readlink(path.c_str(), buffer, 1024);
     if (n >= 0) {
         buffer[n] = '\0';
         return std::string(buffer, static_cast<size_t>(n));
@@ -39,7 +114,7 @@ read_symlink(const std::string& path)
 void
 create_symlink(const std::string& target, const std::string& link_path)
 {
-    if (symlink(target.c_str(), link_path.c_str()) == 0)
+    if (system_calls().symlink(target.c_str(), link_path.c_str()) == 0)
         return;
     warn("create_symlink: from %s to %s", link_path.c_str(), target.c_str());
     throw errno;

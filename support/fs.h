@@ -8,6 +8,31 @@
 #define TZLINKS_SUPPORT_FS_H
 
 #include <string>
+#include <sys/types.h>
+
+// The calls the start-up sequence makes on the file system, each as the
+// system call or C library function it stands for: -1 and errno on
+// failure. tzlinks makes them for real; tzlinks-status puts a simulation in
+// their place and runs the very same sequence to show what the next boot
+// will do, without doing it.
+class velm_system_calls {
+  public:
+    virtual int unlink(const char* path) const;
+    virtual int access(const char* path) const; // F_OK: does it resolve?
+    virtual ssize_t readlink(const char* path, char* buffer, size_t size) const;
+    virtual int symlink(const char* target, const char* path) const;
+    // remove(3): a file, a link or an empty directory.
+    virtual int remove(const char* path) const;
+    // Opens for reading only, never blocking: flags may add O_DIRECTORY.
+    virtual int open_for_reading(const char* path, int flags) const;
+    // Replaces the content of a regular file, created when missing; fails
+    // on anything else at path, a link included (the link is not followed).
+    virtual int write_file(const char* path, const std::string& text) const;
+};
+
+// The calls in use: the real ones unless use_system_calls said otherwise.
+const velm_system_calls& system_calls();
+void use_system_calls(const velm_system_calls& calls);
 
 namespace velm_fs {
 

@@ -1,7 +1,8 @@
 #include "support/version.h"
 
+#include <cerrno>
+#include <climits>
 #include <err.h>
-#include <regex>
 #include <stdexcept>
 
 velm_version::velm_version(const std::string& text)
@@ -9,46 +10,80 @@ velm_version::velm_version(const std::string& text)
     velm_version_parse(*this, text);
 }
 
-// An absent dotted number comes out of the match as empty text; stoi
-// rejects that with invalid_argument, which here simply means "absent".
-// Out-of-range is deliberately left to escape.
-static int32_t
-optional_number(const std::string& digits)
+// Where the run of bytes from first to last that begins at "at" ends.
+static size_t
+run_end(const std::string& text, size_t at, char first, char last)
 {
-    try {
-        return std::stoi(digits);
-    } catch (const std::invalid_argument&) {
-        return -1;
+    while (at < text.size() && text[at] >= first && text[at] <= last)
+        ++at;
+    return at;
+}
+
+// Every group is greedy and each is followed by something it cannot hold
+// (digits by letters or '.', letters by '.' or the end), so taking the
+// longest run each time finds the one way the text can match, if any. No
+// recursion and no backtracking: a text of any length costs one pass.
+velm_version_match
+velm_version_match_text(const std::string& text)
+{
+    velm_version_match match;
+    size_t letters = run_end(text, 0, '0', '9');
+    size_t at = run_end(text, letters, 'a', 'z');
+    if (letters == 0 || at == letters)
+        return match;
+    match.group[1] = text.substr(0, letters);
+    match.group[2] = text.substr(letters, at - letters);
+    for (int minor = 3; minor <= 4 && at < text.size() && text[at] == '.'; ++minor) {
+        size_t end = run_end(text, at + 1, '0', '9');
+        if (end == at + 1)
+            return velm_version_match();
+        match.group[minor] = text.substr(at + 1, end - at - 1);
+        at = end;
     }
+    if (at != text.size())
+        return velm_version_match();
+    match.group[0] = text;
+    match.size = 5;
+    return match;
+}
+
+// Decimal digits to a field, failing as the C++ library's stoi does, which
+// the tool's messages have always followed: out_of_range beyond 32 bits,
+// and errno set to ERANGE only when even a long cannot hold the number.
+static int32_t
+number(const std::string& digits)
+{
+    long value = 0;
+    for (char digit : digits) {
+        if (value > (LONG_MAX - (digit - '0')) / 10) {
+            errno = ERANGE;
+            throw std::out_of_range("stoi");
+        }
+        value = value * 10 + (digit - '0');
+    }
+    if (value > INT32_MAX)
+        throw std::out_of_range("stoi");
+    return static_cast<int32_t>(value);
 }
 
 void
 velm_version_parse(velm_version& version, const std::string& text)
 {
-    // Compiled on every call: a run parses one text per dataset it builds.
-    // The system's +VERSION word has no length limit, and the default
-    // backtracking matcher recurses once per character: a damaged file of a
-    // few tens of kilobytes would overflow the stack. The library's
-    // breadth-first matcher finds the same whole match in constant stack,
-    // and the pattern is unambiguous, so the groups come out the same.
-    const std::regex pattern("([0-9]+)([a-z]+)(?:\\.([0-9]+))?(?:\\.([0-9]+))?",
-                             std::regex::ECMAScript | std::regex_constants::__polynomial);
-    std::smatch results;
-    try {
-        if (!std::regex_match(text, results, pattern) || results.size() != 5) {
-            warn("Cannot parse version string %s, results.size() = %d", text.c_str(),
-                 static_cast<int>(results.size()));
-            throw std::invalid_argument("no match");
-        }
-        version.year = std::stoi(results[1].str());
-        version.letters = results[2].str();
-    } catch (const std::invalid_argument&) {
+    velm_version_match results = velm_version_match_text(text);
+    if (results.size != 5) {
+        warn("Cannot parse version string %s, results.size() = %d", text.c_str(),
+             static_cast<int>(results.size));
         warn("Cannot parse version string %s", text.c_str());
         version = velm_version();
         return;
     }
-    version.minor1 = optional_number(results[3].str());
-    version.minor2 = optional_number(results[4].str());
+    // Assigned in this order: a number out of range leaves the fields
+    // before it replaced.
+    version.year = number(results.group[1]);
+    version.letters = results.group[2];
+    // An absent dotted number is -1, below every present one.
+    version.minor1 = results.group[3].empty() ? -1 : number(results.group[3]);
+    version.minor2 = results.group[4].empty() ? -1 : number(results.group[4]);
 }
 
 bool

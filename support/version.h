@@ -21,6 +21,16 @@ struct velm_version {
     bool operator==(const velm_version& other) const;
 };
 
+// What a whole-text match of ([0-9]+)([a-z]+)(?:\.([0-9]+))?(?:\.([0-9]+))?
+// yields: size is the number of sub-matches, 0 when the text does not
+// match and 5 when it does; group[0] is the whole text, group[1] to [4]
+// year, letters and the two dotted numbers, empty when absent.
+struct velm_version_match {
+    size_t size = 0;
+    std::string group[5];
+};
+velm_version_match velm_version_match_text(const std::string& text);
+
 // Replaces all four fields from text. A text without the version form warns
 // twice and leaves the default state; a number too large for int32_t throws
 // std::out_of_range with no warning, possibly after year and letters were
