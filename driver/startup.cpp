@@ -69,12 +69,6 @@ int
 run_startup_sequence()
 {
     protect_data_directories();
-    return relink_time_zone_data();
-}
-
-int
-relink_time_zone_data()
-{
     migrate_icu_link();
     (void)system_calls().remove("/var/db/icu");
 

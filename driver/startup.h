@@ -10,8 +10,5 @@ const int last_resort_unknown_status = 255;
 // reaches its end, errno (or last_resort_unknown_status) when even the
 // last-resort reset fails, and the run stops there.
 int run_startup_sequence();
-// The same run without the directory protection, which changes no link:
-// what tzlinks-status runs against its simulation of the file system.
-int relink_time_zone_data();
 
 #endif

@@ -28,6 +28,9 @@ class velm_system_calls {
     // Replaces the content of a regular file, created when missing; fails
     // on anything else at path, a link included (the link is not followed).
     virtual int write_file(const char* path, const std::string& text) const;
+    // open, fcntl F_SETPROTECTIONCLASS where the platform has it, close;
+    // every failure ignored.
+    virtual void set_protection_class(const char* path, int protection_class) const;
 };
 
 // The calls in use: the real ones unless use_system_calls said otherwise.

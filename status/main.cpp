@@ -1,0 +1,56 @@
+// tzlinks-status: says which time-zone data a device (or an image of one)
+// uses, what its next boot will do, and what is wrong; changes nothing.
+#include "status/report.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <err.h>
+#include <fcntl.h>
+#include <string>
+
+static const char usage[] = "usage: tzlinks-status [--json] [--root DIR]\n"
+                            "       tzlinks-status --help | --version\n";
+
+static int
+usage_error(const char* why, const std::string& word)
+{
+    warnx("%s: %s", why, word.c_str());
+    fputs(usage, stderr);
+    return 64;
+}
+
+int
+main(int argc, char** argv)
+{
+    bool as_json = false;
+    std::string root = "/";
+    for (int i = 1; i < argc; ++i) {
+        std::string word = argv[i];
+        if (word == "--json") {
+            as_json = true;
+        } else if (word == "--root" && i + 1 < argc) {
+            root = argv[++i];
+        } else if (word.compare(0, 7, "--root=") == 0) {
+            root = word.substr(7);
+        } else if (word == "--help") {
+            fputs(usage, stdout);
+            return 0;
+        } else if (word == "--version") {
+            printf("tzlinks-status %s\n", TZLINKS_VERSION);
+            return 0;
+        } else {
+            return usage_error(word == "--root" ? "missing directory after" : "unknown argument",
+                               word);
+        }
+    }
+    int root_fd = open(root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (root_fd < 0) {
+        warn("cannot read %s", root.c_str());
+        return 66;
+    }
+    velm_simulation tree(root_fd);
+    velm_report report = make_report(tree);
+    fputs((as_json ? json_report(report) : text_report(report)).c_str(), stdout);
+    return report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2;
+}

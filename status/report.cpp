@@ -1,0 +1,330 @@
+#include "status/report.h"
+
+#include "dataset/dataset.h"
+#include "dataset/icu.h"
+#include "driver/startup.h"
+#include "support/prefix.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <functional>
+#include <memory>
+#include <sys/mman.h>
+#include <unistd.h>
+
+static const std::string live_dir = "/var/db/timezone/";
+static const std::string updates = live_dir + "tz/";
+static const std::string system_zoneinfo = "/usr/share/zoneinfo.default";
+static const std::string record_path = live_dir + "TZVersionDiffRecord";
+static const std::string remove_zoneinfo =
+    "remove /var/db/timezone/zoneinfo; the next boot then links the system data and adopts "
+    "the update tz_latest names, relinking zoneinfo and icutz together";
+
+// Runs f with standard error caught and the program named as the boot
+// tool: the product code warns as it does at boot, and those are the
+// messages a boot would write.
+static std::vector<std::string>
+as_tzlinks(const std::function<void()>& f)
+{
+    int saved = dup(2), caught = memfd_create("messages", MFD_CLOEXEC);
+    char* name = program_invocation_short_name;
+    program_invocation_short_name = const_cast<char*>("tzlinks");
+    dup2(caught, 2);
+    f();
+    dup2(saved, 2);
+    close(saved);
+    program_invocation_short_name = name;
+    std::vector<std::string> lines;
+    std::string line;
+    char c;
+    for (off_t at = 0; pread(caught, &c, 1, at) == 1; ++at) {
+        if (c != '\n')
+            line += c;
+        else
+            lines.push_back(std::move(line)), line.clear();
+    }
+    close(caught);
+    return lines;
+}
+
+static velm_text
+link_at(const velm_simulation& tree, const std::string& path)
+{
+    velm_entry entry = tree.look(path);
+    return entry.kind == velm_entry::link ? velm_text(entry.text) : std::nullopt;
+}
+
+static velm_text
+file_at(const velm_simulation& tree, const std::string& path)
+{
+    if (tree.look(path).kind != velm_entry::file)
+        return std::nullopt;
+    std::string text;
+    int fd = tree.open_for_reading(path.c_str(), 0);
+    char buffer[4096];
+    for (ssize_t n; fd >= 0 && (n = read(fd, buffer, sizeof buffer)) > 0;)
+        text.append(buffer, static_cast<size_t>(n));
+    if (fd >= 0)
+        close(fd);
+    return text;
+}
+
+static std::unique_ptr<velm_dataset>
+dataset_at(const std::string& root)
+{
+    try {
+        return std::make_unique<velm_dataset>(root);
+    } catch (...) {
+        return nullptr; // a bad path, or a version number beyond 32 bits
+    }
+}
+
+static velm_dataset_facts
+facts_of(const velm_dataset* dataset, const std::string& root)
+{
+    velm_dataset_facts facts;
+    if (dataset == nullptr)
+        return facts;
+    facts.present = true;
+    facts.root = root;
+    facts.version = dataset->get_version_string();
+    facts.version_understood = dataset->get_version().year >= 0;
+    facts.icu_schema = dynamic_cast<const velm_icu&>(*dataset->get_components().at(1)).get_schema();
+    return facts;
+}
+
+// The links, the record and the three datasets as they stand, read as the
+// boot tool reads them.
+static void
+read_state(const velm_simulation& tree, velm_report& r)
+{
+    r.zoneinfo = link_at(tree, live_dir + "zoneinfo");
+    r.icutz = link_at(tree, live_dir + "icutz");
+    r.localtime = link_at(tree, live_dir + "localtime");
+    r.tz_latest = link_at(tree, live_dir + "tz_latest");
+    r.record = file_at(tree, record_path);
+    if (r.localtime && has_prefix(*r.localtime, (live_dir + "zoneinfo/").c_str()))
+        r.localtime_zone = r.localtime->substr(live_dir.size() + 9);
+    as_tzlinks([&] {
+        auto system = dataset_at("");
+        std::unique_ptr<velm_dataset> live, latest;
+        try {
+            r.live.root = current_dataset_path();
+            live = dataset_at(r.live.root);
+        } catch (...) {
+            // No zoneinfo link that the tool understands.
+        }
+        try {
+            r.latest.root = latest_dataset_path();
+            latest = r.latest.root.empty() ? nullptr : dataset_at(r.latest.root);
+        } catch (...) {
+            // A tz_latest that is no link.
+        }
+        r.system = facts_of(system.get(), "");
+        r.live = facts_of(live.get(), r.live.root);
+        r.latest = facts_of(latest.get(), r.latest.root);
+        if (!system)
+            return;
+        const velm_dataset& current = live ? *live : *system;
+        r.live.compatible = live && live->compatible(*system);
+        r.live.older = live && *system > *live;
+        r.live.newer = live && *live > *system;
+        r.latest.compatible = latest && latest->compatible(*system);
+        r.latest.newer = latest && *latest > current;
+    });
+}
+
+// Runs the boot tool's own start-up sequence on the simulation and notes
+// what it leaves.
+static void
+simulate_next_boot(velm_simulation& tree, velm_report& r)
+{
+    r.next_boot.messages = as_tzlinks([&] {
+        errno = 0; // as in a process just started
+        r.next_boot.exit_status = run_startup_sequence();
+    });
+    r.next_boot.zoneinfo = link_at(tree, live_dir + "zoneinfo");
+    r.next_boot.icutz = link_at(tree, live_dir + "icutz");
+    r.next_boot.localtime = link_at(tree, live_dir + "localtime");
+    if (tree.written(record_path))
+        r.next_boot.record = tree.look(record_path).text;
+}
+
+static void
+add(velm_report& r, const char* severity, const std::string& id, const std::string& message,
+    const std::string& repair)
+{
+    r.findings.push_back({id, severity, message, repair});
+}
+
+static std::string
+quoted(const velm_text& text)
+{
+    return text ? "\"" + *text + "\"" : "nothing";
+}
+
+// What stands in the tree before the next boot changes anything.
+struct velm_now {
+    bool system_data, zoneinfo_usable, localtime_usable, latest_entry, record_other;
+    bool legacy_icutz, legacy_icu;
+};
+
+static velm_now
+look_now(const velm_simulation& tree)
+{
+    auto kind = [&tree](const std::string& path, bool follow) {
+        return tree.look(path, follow).kind;
+    };
+    velm_entry::kind_t record = kind(record_path, false);
+    return {kind(system_zoneinfo, true) == velm_entry::directory,
+            kind(live_dir + "zoneinfo", true) == velm_entry::directory,
+            kind(live_dir + "localtime", true) == velm_entry::file,
+            kind(live_dir + "tz_latest", false) != velm_entry::absent,
+            record != velm_entry::absent && record != velm_entry::file,
+            kind("/var/db/icutz", false) != velm_entry::absent,
+            kind("/var/db/icu", false) != velm_entry::absent};
+}
+
+// The datasets: the system's, the one in use and the latest update.
+static void
+find_data_problems(const velm_now& now, velm_report& r)
+{
+    if (!now.system_data)
+        add(r, "error", "no-system-data",
+            system_zoneinfo + " is no directory: there is no system tz database to fall back on.",
+            "install the system's time-zone data");
+    else if (!r.system.present)
+        add(r, "error", "system-version",
+            "The first word of " + system_zoneinfo +
+                "/+VERSION holds a number too large for a "
+                "version: not even the system data can be linked.",
+            "write the version, such as 2023c, as the first word of that file");
+    else if (!r.system.version_understood)
+        add(r, "warning", "system-version",
+            "The system data's version is \"" + r.system.version +
+                "\", which is not a version: every boot warns about it, the system data orders "
+                "below every update, and the data in use is never found older than it.",
+            "write the version, such as 2023c, as the first word of " + system_zoneinfo +
+                "/+VERSION");
+    if (!now.zoneinfo_usable)
+        add(r, "error", "zoneinfo-unusable",
+            "/var/db/timezone/zoneinfo names " + quoted(r.zoneinfo) +
+                ", which leads to no tz database: readers have none until a boot links one.",
+            "run tzlinks (or boot): it links the data shown under next boot");
+    else if (!r.live.present)
+        add(r, "warning", "zoneinfo-not-understood",
+            "/var/db/timezone/zoneinfo names " + quoted(r.zoneinfo) +
+                ", which is neither an update below " + updates + " nor " + system_zoneinfo +
+                ": the next boot resets to the system data.",
+            "none needed: the next boot resets it");
+    else if (r.system.present && (!r.live.compatible || r.live.older))
+        add(r, "warning", "live-rejected",
+            "The data in use, " + r.live.version + ", is " +
+                (r.live.compatible
+                     ? "older than the system data, " + r.system.version
+                     : "incompatible with the system data (ICU schema \"" + r.live.icu_schema +
+                           "\", the system's \"" + r.system.icu_schema + "\")") +
+                ": the next boot resets to the system data.",
+            "none needed: the next boot resets it");
+    if (now.latest_entry && !r.latest.present)
+        add(r, "warning", "latest-not-understood",
+            "tz_latest names " + quoted(r.tz_latest) + ", which is not an update below " + updates +
+                (r.tz_latest && !has_prefix(*r.tz_latest, "/") ? " (a relative target is never "
+                                                                 "understood)"
+                                                               : "") +
+                ": every boot resets to the system data.",
+            "make tz_latest a link to " + updates + "<version>, by its absolute path");
+    else if (r.latest.present && !(r.latest.compatible && r.latest.newer))
+        add(r, "note", "latest-refused",
+            r.latest.root == r.live.root && r.live.present
+                ? "tz_latest names the data in use; every boot says so."
+                : "The next boot does not adopt " + r.latest.version + ": it is " +
+                      (r.latest.compatible ? "not newer than the data in use"
+                                           : "incompatible with the system data") +
+                      ".",
+            "none needed");
+}
+
+// The links as the next boot leaves them: a state that no later boot
+// changes shows here, where the boot tool never looks again.
+static void
+find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report& r)
+{
+    const auto& next = r.next_boot;
+    std::string update = next.zoneinfo && has_prefix(*next.zoneinfo, updates.c_str())
+                             ? next.zoneinfo->substr(0, next.zoneinfo->rfind('/'))
+                             : "";
+    bool icutz = tree.look(live_dir + "icutz").kind != velm_entry::absent;
+    if (next.exit_status != 0)
+        add(r, "error", "next-boot-fails",
+            "The next boot cannot even link the system data (exit status " +
+                std::to_string(next.exit_status) + ").",
+            "see the messages of the next boot");
+    else if (tree.look(live_dir + "zoneinfo", true).kind != velm_entry::directory)
+        add(r, "error", "next-boot-unusable",
+            "The next boot links zoneinfo to " + quoted(next.zoneinfo) +
+                ", where there is no tz database: every reader would fall back to UTC.",
+            "unpack the update whole, its zoneinfo directory included");
+    else if (!update.empty() && next.icutz != update + "/icutz")
+        add(r, "warning", icutz ? "icutz-stale" : "icutz-missing",
+            "icutz names " + quoted(next.icutz) + ", not the ICU data of the update in use, " +
+                update +
+                ": ICU readers use other data than the tz database, and no boot "
+                "changes that.",
+            remove_zoneinfo);
+    else if (update.empty() && icutz)
+        add(r, "warning", "icutz-with-system",
+            "icutz is there while the system data is in use: ICU readers use data that is "
+            "not the system's, and no boot changes that.",
+            remove_zoneinfo);
+    if (!now.localtime_usable || !r.localtime)
+        add(r, "error", "localtime-unusable",
+            "localtime names " + quoted(r.localtime) + ", which is no link to a zone file; " +
+                "the next boot leaves " + quoted(next.localtime) + ".",
+            "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
+    else if (next.localtime != r.localtime &&
+             next.localtime == live_dir + "zoneinfo/America/Los_Angeles")
+        add(r, "warning",
+            has_prefix(*r.localtime, (system_zoneinfo + "/").c_str()) ? "localtime-legacy-default"
+                                                                      : "localtime-reset",
+            "localtime names " + quoted(r.localtime) +
+                ", which the next boot does not accept: it sets the zone to America/Los_Angeles.",
+            "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
+    if (now.record_other)
+        add(r, "warning", "record-not-a-file",
+            record_path + " is no regular file: no adoption is ever recorded there.",
+            "remove " + record_path);
+    if (now.legacy_icutz || now.legacy_icu)
+        add(r, "note", "legacy-entries",
+            std::string("/var/db/icutz or /var/db/icu is still there") +
+                (tree.look("/var/db/icutz").kind != velm_entry::absent ||
+                         tree.look("/var/db/icu").kind != velm_entry::absent
+                     ? ", and the next boot leaves it."
+                     : "; the next boot clears it away."),
+            "none needed");
+}
+
+velm_report
+make_report(velm_simulation& tree)
+{
+    velm_report r;
+    const velm_system_calls& real = system_calls();
+    use_system_calls(tree);
+    tree.reset();
+    read_state(tree, r);
+    velm_now now = look_now(tree);
+    find_data_problems(now, r);
+    simulate_next_boot(tree, r);
+    find_link_problems(tree, now, r);
+    tree.reset();
+    use_system_calls(real);
+    r.health = "healthy";
+    for (const velm_finding& finding : r.findings) {
+        if (finding.severity == "error")
+            r.health = "broken";
+        else if (finding.severity == "warning" && r.health == "healthy")
+            r.health = "degraded";
+    }
+    return r;
+}
