@@ -115,9 +115,9 @@ json_report(const velm_report& r)
            json(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +
            ",\"live\":" + json(r.live, "live") + ",\"system\":" + json(r.system, "") +
            ",\"latest\":" + json(r.latest, "latest") +
-           ",\"next_boot\":{\"zoneinfo\":" + json(next.zoneinfo) +
-           ",\"icutz\":" + json(next.icutz) + ",\"localtime\":" + json(next.localtime) +
-           ",\"record\":" + json(next.record) +
+           ",\"next_boot\":{\"action\":" + json(next.action) +
+           ",\"zoneinfo\":" + json(next.zoneinfo) + ",\"icutz\":" + json(next.icutz) +
+           ",\"localtime\":" + json(next.localtime) + ",\"record\":" + json(next.record) +
            ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
            "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) + "}\n";
 }
@@ -165,6 +165,10 @@ text_report(const velm_report& r)
     out += line("tz_latest", link(r.tz_latest));
     out += line("record", r.record ? *r.record : "(none)");
     out += "next boot\n";
+    out += line("does", next.action == "adopt"   ? "adopts " + r.latest.version
+                        : next.action == "reset" ? "resets to the system data"
+                        : next.action == "keep"  ? "keeps the data in use"
+                                                 : "fails: not even the system data can be linked");
     out += line("zoneinfo", link(next.zoneinfo));
     out += line("icutz", link(next.icutz));
     out += line("localtime", link(next.localtime));

@@ -10,6 +10,7 @@
 #include <cstring>
 #include <functional>
 #include <memory>
+#include <set>
 #include <sys/mman.h>
 #include <unistd.h>
 
@@ -111,6 +112,7 @@ read_state(const velm_simulation& tree, velm_report& r)
         std::unique_ptr<velm_dataset> live, latest;
         try {
             r.live.root = current_dataset_path();
+            r.zoneinfo_understood = true;
             live = dataset_at(r.live.root);
         } catch (...) {
             // No zoneinfo link that the tool understands.
@@ -149,6 +151,11 @@ simulate_next_boot(velm_simulation& tree, velm_report& r)
     r.next_boot.localtime = link_at(tree, live_dir + "localtime");
     if (tree.written(record_path))
         r.next_boot.record = tree.look(record_path).text;
+    const auto& next = r.next_boot.zoneinfo;
+    r.next_boot.action = r.next_boot.exit_status != 0 ? "fail"
+                         : next == r.zoneinfo         ? "keep"
+                         : next == system_zoneinfo    ? "reset"
+                                                      : "adopt";
 }
 
 static void
@@ -186,6 +193,24 @@ look_now(const velm_simulation& tree)
             kind("/var/db/icu", false) != velm_entry::absent};
 }
 
+// Entries that cannot be looked at: searching a directory is refused, a
+// link loops, a name is too long. What lies behind them counts as missing.
+// One finding for each cause: a link that loops also stops what leads
+// through it.
+static void
+find_unreadable(const velm_simulation& tree, velm_report& r)
+{
+    std::set<int> seen = {0, ENOENT, ENOTDIR};
+    for (const std::string& path :
+         {system_zoneinfo, std::string("/usr/share/icu"), live_dir + "zoneinfo", live_dir + "icutz",
+          live_dir + "localtime", live_dir + "tz_latest", record_path}) {
+        int error = tree.look(path, true).error;
+        if (seen.insert(error).second)
+            add(r, "warning", "unreadable", path + " cannot be followed: " + strerror(error) + ".",
+                "make it readable, or remove it");
+    }
+}
+
 // The datasets: the system's, the one in use and the latest update.
 static void
 find_data_problems(const velm_now& now, velm_report& r)
@@ -212,11 +237,16 @@ find_data_problems(const velm_now& now, velm_report& r)
             "/var/db/timezone/zoneinfo names " + quoted(r.zoneinfo) +
                 ", which leads to no tz database: readers have none until a boot links one.",
             "run tzlinks (or boot): it links the data shown under next boot");
-    else if (!r.live.present)
+    else if (!r.zoneinfo_understood)
         add(r, "warning", "zoneinfo-not-understood",
             "/var/db/timezone/zoneinfo names " + quoted(r.zoneinfo) +
                 ", which is neither an update below " + updates + " nor " + system_zoneinfo +
                 ": the next boot resets to the system data.",
+            "none needed: the next boot resets it");
+    else if (r.system.present && !r.live.present)
+        add(r, "warning", "live-rejected",
+            "The data in use has a version number too large: the next boot resets to the "
+            "system data.",
             "none needed: the next boot resets it");
     else if (r.system.present && (!r.live.compatible || r.live.older))
         add(r, "warning", "live-rejected",
@@ -314,6 +344,7 @@ make_report(velm_simulation& tree)
     tree.reset();
     read_state(tree, r);
     velm_now now = look_now(tree);
+    find_unreadable(tree, r);
     find_data_problems(now, r);
     simulate_next_boot(tree, r);
     find_link_problems(tree, now, r);

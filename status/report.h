@@ -28,9 +28,11 @@ struct velm_finding {
 
 struct velm_report {
     velm_text zoneinfo, icutz, localtime, tz_latest, record;
-    std::string localtime_zone; // what follows the live tree's prefix, if anything
+    bool zoneinfo_understood = false; // names an update's or the system's tz database
+    std::string localtime_zone;       // what follows the live tree's prefix, if anything
     velm_dataset_facts live, system, latest;
     struct {
+        std::string action; // keep, adopt (the update tz_latest names), reset or fail
         velm_text zoneinfo, icutz, localtime, record;
         std::vector<std::string> messages; // what the run writes on standard error
         int exit_status = 0;
