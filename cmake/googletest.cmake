@@ -1,11 +1,12 @@
 # Provides GoogleTest to the test suite. A native build links Debian's
-# prebuilt library; a cross build (or a machine that lacks the library)
-# compiles it for the target from Debian's source package, and the later
-# find_package(GTest) is answered by that in-tree build.
+# prebuilt library; a cross build, a build against libc++ (the prebuilt one
+# is made for libstdc++) or a machine that lacks the library compiles it for
+# the target from Debian's source package, and the later find_package(GTest)
+# is answered by that in-tree build.
 set(TZLINKS_GOOGLETEST_SOURCE /usr/src/googletest
     CACHE PATH "GoogleTest sources, used when no prebuilt library fits the target")
 
-if(NOT CMAKE_CROSSCOMPILING)
+if(NOT CMAKE_CROSSCOMPILING AND NOT CMAKE_CXX_FLAGS MATCHES "-stdlib=libc\\+\\+")
     find_package(GTest QUIET)
 endif()
 

@@ -16,7 +16,7 @@ static int
 usage_error(const char* why, const std::string& word)
 {
     warnx("%s: %s", why, word.c_str());
-    fputs(usage, stderr);
+    (void)fputs(usage, stderr);
     return 64;
 }
 
@@ -34,7 +34,7 @@ main(int argc, char** argv)
         } else if (word.compare(0, 7, "--root=") == 0) {
             root = word.substr(7);
         } else if (word == "--help") {
-            fputs(usage, stdout);
+            (void)fputs(usage, stdout);
             return 0;
         } else if (word == "--version") {
             printf("tzlinks-status %s\n", TZLINKS_VERSION);
@@ -51,6 +51,6 @@ main(int argc, char** argv)
     }
     velm_simulation tree(root_fd);
     velm_report report = make_report(tree);
-    fputs((as_json ? json_report(report) : text_report(report)).c_str(), stdout);
+    (void)fputs((as_json ? json_report(report) : text_report(report)).c_str(), stdout);
     return report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2;
 }

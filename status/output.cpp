@@ -28,7 +28,7 @@ static std::string
 hex(const char* form, unsigned char byte)
 {
     char text[8];
-    snprintf(text, sizeof text, form, byte);
+    (void)snprintf(text, sizeof text, form, byte);
     return text;
 }
 
@@ -57,7 +57,7 @@ json(const std::string& text)
     std::string out = "\"";
     for (size_t i = 0; i < text.size();) {
         size_t n = utf8_length(text, i);
-        unsigned char c = static_cast<unsigned char>(text[i]);
+        auto c = static_cast<unsigned char>(text[i]);
         if (n == 0)
             out += hex("\\udc%02x", c), n = 1;
         else if (c == '"' || c == '\\')
@@ -114,10 +114,10 @@ json_report(const velm_report& r)
            ",\"record\":" + json(r.record) + ",\"localtime_zone\":" +
            json(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +
            ",\"live\":" + json(r.live, "live") + ",\"system\":" + json(r.system, "") +
-           ",\"latest\":" + json(r.latest, "latest") +
-           ",\"next_boot\":{\"action\":" + json(next.action) +
-           ",\"zoneinfo\":" + json(next.zoneinfo) + ",\"icutz\":" + json(next.icutz) +
-           ",\"localtime\":" + json(next.localtime) + ",\"record\":" + json(next.record) +
+           ",\"latest\":" + json(r.latest, "latest") + R"(,"next_boot":{"action":)" +
+           json(next.action) + ",\"zoneinfo\":" + json(next.zoneinfo) +
+           ",\"icutz\":" + json(next.icutz) + ",\"localtime\":" + json(next.localtime) +
+           ",\"record\":" + json(next.record) +
            ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
            "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) + "}\n";
 }

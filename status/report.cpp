@@ -14,11 +14,11 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
-static const std::string live_dir = "/var/db/timezone/";
-static const std::string updates = live_dir + "tz/";
-static const std::string system_zoneinfo = "/usr/share/zoneinfo.default";
-static const std::string record_path = live_dir + "TZVersionDiffRecord";
-static const std::string remove_zoneinfo =
+static const char live_dir[] = "/var/db/timezone/";
+static const char updates[] = "/var/db/timezone/tz/";
+static const char system_zoneinfo[] = "/usr/share/zoneinfo.default";
+static const char record_path[] = "/var/db/timezone/TZVersionDiffRecord";
+static const char remove_zoneinfo[] =
     "remove /var/db/timezone/zoneinfo; the next boot then links the system data and adopts "
     "the update tz_latest names, relinking zoneinfo and icutz together";
 
@@ -100,13 +100,13 @@ facts_of(const velm_dataset* dataset, const std::string& root)
 static void
 read_state(const velm_simulation& tree, velm_report& r)
 {
-    r.zoneinfo = link_at(tree, live_dir + "zoneinfo");
-    r.icutz = link_at(tree, live_dir + "icutz");
-    r.localtime = link_at(tree, live_dir + "localtime");
-    r.tz_latest = link_at(tree, live_dir + "tz_latest");
+    r.zoneinfo = link_at(tree, "/var/db/timezone/zoneinfo");
+    r.icutz = link_at(tree, "/var/db/timezone/icutz");
+    r.localtime = link_at(tree, "/var/db/timezone/localtime");
+    r.tz_latest = link_at(tree, "/var/db/timezone/tz_latest");
     r.record = file_at(tree, record_path);
-    if (r.localtime && has_prefix(*r.localtime, (live_dir + "zoneinfo/").c_str()))
-        r.localtime_zone = r.localtime->substr(live_dir.size() + 9);
+    if (r.localtime && has_prefix(*r.localtime, "/var/db/timezone/zoneinfo/"))
+        r.localtime_zone = r.localtime->substr(sizeof live_dir - 1 + 9);
     as_tzlinks([&] {
         auto system = dataset_at("");
         std::unique_ptr<velm_dataset> live, latest;
@@ -140,15 +140,15 @@ read_state(const velm_simulation& tree, velm_report& r)
 // Runs the boot tool's own start-up sequence on the simulation and notes
 // what it leaves.
 static void
-simulate_next_boot(velm_simulation& tree, velm_report& r)
+simulate_next_boot(const velm_simulation& tree, velm_report& r)
 {
     r.next_boot.messages = as_tzlinks([&] {
         errno = 0; // as in a process just started
         r.next_boot.exit_status = run_startup_sequence();
     });
-    r.next_boot.zoneinfo = link_at(tree, live_dir + "zoneinfo");
-    r.next_boot.icutz = link_at(tree, live_dir + "icutz");
-    r.next_boot.localtime = link_at(tree, live_dir + "localtime");
+    r.next_boot.zoneinfo = link_at(tree, "/var/db/timezone/zoneinfo");
+    r.next_boot.icutz = link_at(tree, "/var/db/timezone/icutz");
+    r.next_boot.localtime = link_at(tree, "/var/db/timezone/localtime");
     if (tree.written(record_path))
         r.next_boot.record = tree.look(record_path).text;
     const auto& next = r.next_boot.zoneinfo;
@@ -185,9 +185,9 @@ look_now(const velm_simulation& tree)
     };
     velm_entry::kind_t record = kind(record_path, false);
     return {kind(system_zoneinfo, true) == velm_entry::directory,
-            kind(live_dir + "zoneinfo", true) == velm_entry::directory,
-            kind(live_dir + "localtime", true) == velm_entry::file,
-            kind(live_dir + "tz_latest", false) != velm_entry::absent,
+            kind("/var/db/timezone/zoneinfo", true) == velm_entry::directory,
+            kind("/var/db/timezone/localtime", true) == velm_entry::file,
+            kind("/var/db/timezone/tz_latest", false) != velm_entry::absent,
             record != velm_entry::absent && record != velm_entry::file,
             kind("/var/db/icutz", false) != velm_entry::absent,
             kind("/var/db/icu", false) != velm_entry::absent};
@@ -201,12 +201,13 @@ static void
 find_unreadable(const velm_simulation& tree, velm_report& r)
 {
     std::set<int> seen = {0, ENOENT, ENOTDIR};
-    for (const std::string& path :
-         {system_zoneinfo, std::string("/usr/share/icu"), live_dir + "zoneinfo", live_dir + "icutz",
-          live_dir + "localtime", live_dir + "tz_latest", record_path}) {
+    for (const char* path :
+         {system_zoneinfo, "/usr/share/icu", "/var/db/timezone/zoneinfo", "/var/db/timezone/icutz",
+          "/var/db/timezone/localtime", "/var/db/timezone/tz_latest", record_path}) {
         int error = tree.look(path, true).error;
         if (seen.insert(error).second)
-            add(r, "warning", "unreadable", path + " cannot be followed: " + strerror(error) + ".",
+            add(r, "warning", "unreadable",
+                std::string(path) + " cannot be followed: " + strerror(error) + ".",
                 "make it readable, or remove it");
     }
 }
@@ -217,11 +218,12 @@ find_data_problems(const velm_now& now, velm_report& r)
 {
     if (!now.system_data)
         add(r, "error", "no-system-data",
-            system_zoneinfo + " is no directory: there is no system tz database to fall back on.",
+            std::string(system_zoneinfo) +
+                " is no directory: there is no system tz database to fall back on.",
             "install the system's time-zone data");
     else if (!r.system.present)
         add(r, "error", "system-version",
-            "The first word of " + system_zoneinfo +
+            std::string("The first word of ") + system_zoneinfo +
                 "/+VERSION holds a number too large for a "
                 "version: not even the system data can be linked.",
             "write the version, such as 2023c, as the first word of that file");
@@ -230,8 +232,8 @@ find_data_problems(const velm_now& now, velm_report& r)
             "The system data's version is \"" + r.system.version +
                 "\", which is not a version: every boot warns about it, the system data orders "
                 "below every update, and the data in use is never found older than it.",
-            "write the version, such as 2023c, as the first word of " + system_zoneinfo +
-                "/+VERSION");
+            std::string("write the version, such as 2023c, as the first word of ") +
+                system_zoneinfo + "/+VERSION");
     if (!now.zoneinfo_usable)
         add(r, "error", "zoneinfo-unusable",
             "/var/db/timezone/zoneinfo names " + quoted(r.zoneinfo) +
@@ -264,7 +266,7 @@ find_data_problems(const velm_now& now, velm_report& r)
                                                                  "understood)"
                                                                : "") +
                 ": every boot resets to the system data.",
-            "make tz_latest a link to " + updates + "<version>, by its absolute path");
+            std::string("make tz_latest a link to ") + updates + "<version>, by its absolute path");
     else if (r.latest.present && !(r.latest.compatible && r.latest.newer))
         add(r, "note", "latest-refused",
             r.latest.root == r.live.root && r.live.present
@@ -282,16 +284,16 @@ static void
 find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report& r)
 {
     const auto& next = r.next_boot;
-    std::string update = next.zoneinfo && has_prefix(*next.zoneinfo, updates.c_str())
+    std::string update = next.zoneinfo && has_prefix(*next.zoneinfo, updates)
                              ? next.zoneinfo->substr(0, next.zoneinfo->rfind('/'))
                              : "";
-    bool icutz = tree.look(live_dir + "icutz").kind != velm_entry::absent;
+    bool icutz = tree.look("/var/db/timezone/icutz").kind != velm_entry::absent;
     if (next.exit_status != 0)
         add(r, "error", "next-boot-fails",
             "The next boot cannot even link the system data (exit status " +
                 std::to_string(next.exit_status) + ").",
             "see the messages of the next boot");
-    else if (tree.look(live_dir + "zoneinfo", true).kind != velm_entry::directory)
+    else if (tree.look("/var/db/timezone/zoneinfo", true).kind != velm_entry::directory)
         add(r, "error", "next-boot-unusable",
             "The next boot links zoneinfo to " + quoted(next.zoneinfo) +
                 ", where there is no tz database: every reader would fall back to UTC.",
@@ -314,17 +316,17 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
                 "the next boot leaves " + quoted(next.localtime) + ".",
             "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
     else if (next.localtime != r.localtime &&
-             next.localtime == live_dir + "zoneinfo/America/Los_Angeles")
+             next.localtime == "/var/db/timezone/zoneinfo/America/Los_Angeles")
         add(r, "warning",
-            has_prefix(*r.localtime, (system_zoneinfo + "/").c_str()) ? "localtime-legacy-default"
-                                                                      : "localtime-reset",
+            has_prefix(*r.localtime, "/usr/share/zoneinfo.default/") ? "localtime-legacy-default"
+                                                                     : "localtime-reset",
             "localtime names " + quoted(r.localtime) +
                 ", which the next boot does not accept: it sets the zone to America/Los_Angeles.",
             "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
     if (now.record_other)
         add(r, "warning", "record-not-a-file",
-            record_path + " is no regular file: no adoption is ever recorded there.",
-            "remove " + record_path);
+            std::string(record_path) + " is no regular file: no adoption is ever recorded there.",
+            std::string("remove ") + record_path);
     if (now.legacy_icutz || now.legacy_icu)
         add(r, "note", "legacy-entries",
             std::string("/var/db/icutz or /var/db/icu is still there") +

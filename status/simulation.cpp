@@ -76,7 +76,8 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
             canonical.erase(std::min(canonical.rfind('/'), canonical.size()));
         if (name == "." || name == "..")
             continue;
-        std::string next = canonical + "/" + name;
+        std::string next = canonical;
+        next.append("/").append(name);
         entry = entry_at(next);
         bool last = todo.empty();
         if (entry.error != 0)
@@ -172,7 +173,9 @@ velm_simulation::readlink(const char* path, char* buffer, size_t size) const
 }
 
 int
-velm_simulation::symlink(const char* target, const char* path) const
+velm_simulation::symlink(
+    const char* target, // NOLINT(bugprone-easily-swappable-parameters): symlink(2)'s order
+    const char* path) const
 {
     int saved = errno;
     std::string canonical;
@@ -200,10 +203,11 @@ velm_simulation::empty_directory(const std::string& canonical) const
         openat(root, relative(canonical).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
     DIR* directory = fd < 0 ? nullptr : fdopendir(fd);
     bool empty = directory != nullptr;
+    // cppcheck-suppress readdirCalled ; one thread, one directory stream
     while (const struct dirent* child = empty ? readdir(directory) : nullptr) {
-        std::string name = child->d_name;
+        std::string name = child->d_name, path = canonical;
         if (name != "." && name != "..")
-            empty = entry_at(canonical + "/" + name).kind == velm_entry::absent;
+            empty = entry_at(path.append("/").append(name)).kind == velm_entry::absent;
     }
     if (directory != nullptr)
         closedir(directory);

@@ -16,6 +16,7 @@
 #include <regex>
 #include <sched.h>
 #include <set>
+#include <sstream>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/wait.h>

@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 #include <iterator>
 #include <sched.h>
+#include <sstream>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/wait.h>
