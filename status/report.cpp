@@ -8,13 +8,14 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <fcntl.h>
 #include <functional>
 #include <memory>
 #include <set>
 #include <sys/mman.h>
 #include <unistd.h>
 
-static const char live_dir[] = "/var/db/timezone/";
+static const char live_zoneinfo[] = "/var/db/timezone/zoneinfo/";
 static const char updates[] = "/var/db/timezone/tz/";
 static const char system_zoneinfo[] = "/usr/share/zoneinfo.default";
 static const char record_path[] = "/var/db/timezone/TZVersionDiffRecord";
@@ -105,8 +106,8 @@ read_state(const velm_simulation& tree, velm_report& r)
     r.localtime = link_at(tree, "/var/db/timezone/localtime");
     r.tz_latest = link_at(tree, "/var/db/timezone/tz_latest");
     r.record = file_at(tree, record_path);
-    if (r.localtime && has_prefix(*r.localtime, "/var/db/timezone/zoneinfo/"))
-        r.localtime_zone = r.localtime->substr(sizeof live_dir - 1 + 9);
+    if (r.localtime && has_prefix(*r.localtime, live_zoneinfo))
+        r.localtime_zone = r.localtime->substr(sizeof live_zoneinfo - 1);
     as_tzlinks([&] {
         auto system = dataset_at("");
         std::unique_ptr<velm_dataset> live, latest;
@@ -174,7 +175,7 @@ quoted(const velm_text& text)
 // What stands in the tree before the next boot changes anything.
 struct velm_now {
     bool system_data, zoneinfo_usable, localtime_usable, latest_entry, record_other;
-    bool legacy_icutz, legacy_icu;
+    std::set<std::string> legacy; // of /var/db/icutz and /var/db/icu
 };
 
 static velm_now
@@ -183,14 +184,19 @@ look_now(const velm_simulation& tree)
     auto kind = [&tree](const std::string& path, bool follow) {
         return tree.look(path, follow).kind;
     };
-    velm_entry::kind_t record = kind(record_path, false);
-    return {kind(system_zoneinfo, true) == velm_entry::directory,
-            kind("/var/db/timezone/zoneinfo", true) == velm_entry::directory,
-            kind("/var/db/timezone/localtime", true) == velm_entry::file,
-            kind("/var/db/timezone/tz_latest", false) != velm_entry::absent,
-            record != velm_entry::absent && record != velm_entry::file,
-            kind("/var/db/icutz", false) != velm_entry::absent,
-            kind("/var/db/icu", false) != velm_entry::absent};
+    velm_entry record = tree.look(record_path);
+    velm_now now = {kind(system_zoneinfo, true) == velm_entry::directory,
+                    kind("/var/db/timezone/zoneinfo", true) == velm_entry::directory,
+                    kind("/var/db/timezone/localtime", true) == velm_entry::file,
+                    kind("/var/db/timezone/tz_latest", false) != velm_entry::absent,
+                    record.kind != velm_entry::absent &&
+                        (record.kind != velm_entry::file || record.shared),
+                    {}};
+    for (const char* legacy : {"/var/db/icutz", "/var/db/icu"}) {
+        if (tree.look(legacy).kind != velm_entry::absent)
+            now.legacy.insert(legacy);
+    }
+    return now;
 }
 
 // Entries that cannot be looked at: searching a directory is refused, a
@@ -208,6 +214,16 @@ find_unreadable(const velm_simulation& tree, velm_report& r)
         if (seen.insert(error).second)
             add(r, "warning", "unreadable",
                 std::string(path) + " cannot be followed: " + strerror(error) + ".",
+                "make it readable, or remove it");
+    }
+    // An update's ICU directory is read, not only looked up.
+    for (const std::string& root : {r.live.root, r.latest.root}) {
+        int fd = root.empty() ? -1 : tree.open_for_reading((root + "/icutz").c_str(), O_DIRECTORY);
+        if (fd >= 0)
+            close(fd);
+        else if (!root.empty() && seen.insert(errno).second)
+            add(r, "warning", "unreadable",
+                root + "/icutz cannot be read: " + strerror(errno) + ".",
                 "make it readable, or remove it");
     }
 }
@@ -310,11 +326,13 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
             "icutz is there while the system data is in use: ICU readers use data that is "
             "not the system's, and no boot changes that.",
             remove_zoneinfo);
+    bool next_usable = tree.look("/var/db/timezone/localtime", true).kind == velm_entry::file;
     if (!now.localtime_usable || !r.localtime)
         add(r, "error", "localtime-unusable",
             "localtime names " + quoted(r.localtime) + ", which is no link to a zone file; " +
                 "the next boot leaves " + quoted(next.localtime) + ".",
-            "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
+            next_usable ? "run tzlinks (or boot): it sets localtime as shown under next boot"
+                        : "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
     else if (next.localtime != r.localtime &&
              next.localtime == "/var/db/timezone/zoneinfo/America/Los_Angeles")
         add(r, "warning",
@@ -325,16 +343,17 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
             "point /var/db/timezone/localtime at /var/db/timezone/zoneinfo/<zone>");
     if (now.record_other)
         add(r, "warning", "record-not-a-file",
-            std::string(record_path) + " is no regular file: no adoption is ever recorded there.",
+            std::string(record_path) +
+                " is no regular file of its own: no adoption is ever recorded there.",
             std::string("remove ") + record_path);
-    if (now.legacy_icutz || now.legacy_icu)
-        add(r, "note", "legacy-entries",
-            std::string("/var/db/icutz or /var/db/icu is still there") +
-                (tree.look("/var/db/icutz").kind != velm_entry::absent ||
-                         tree.look("/var/db/icu").kind != velm_entry::absent
-                     ? ", and the next boot leaves it."
-                     : "; the next boot clears it away."),
-            "none needed");
+    for (const char* legacy : {"/var/db/icutz", "/var/db/icu"}) {
+        if (now.legacy.count(legacy) != 0)
+            add(r, "note", "legacy-entries",
+                std::string(legacy) + (tree.look(legacy).kind != velm_entry::absent
+                                           ? " is still there, and the next boot leaves it."
+                                           : " is still there; the next boot clears it away."),
+                "none needed");
+    }
 }
 
 velm_report

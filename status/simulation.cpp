@@ -29,6 +29,7 @@ velm_simulation::real_entry(const std::string& canonical) const
         ssize_t n = readlinkat(root, relative(canonical).c_str(), target.data(), target.size());
         entry.text.assign(target.data(), n > 0 ? static_cast<size_t>(n) : 0);
     }
+    entry.shared = S_ISREG(st.st_mode) && st.st_nlink > 1;
     entry.kind = S_ISLNK(st.st_mode)   ? velm_entry::link
                  : S_ISREG(st.st_mode) ? velm_entry::file
                  : S_ISDIR(st.st_mode) ? velm_entry::directory
@@ -186,7 +187,7 @@ velm_simulation::symlink(
         return fail(EEXIST);
     if (*target == '\0')
         return fail(ENOENT);
-    changed[canonical] = velm_entry{velm_entry::link, target, 0};
+    changed[canonical] = velm_entry{velm_entry::link, target, 0, false};
     errno = saved;
     return 0;
 }
@@ -261,7 +262,11 @@ velm_simulation::write_file(const char* path, const std::string& text) const
         return fail(entry.kind == velm_entry::link        ? ELOOP
                     : entry.kind == velm_entry::directory ? EISDIR
                                                           : ENXIO);
-    changed[canonical] = velm_entry{velm_entry::file, text, 0};
+    if (entry.shared) { // the real call opens it, and finds another name
+        errno = saved;
+        return -1;
+    }
+    changed[canonical] = velm_entry{velm_entry::file, text, 0, false};
     writes[canonical] = true;
     errno = saved;
     return 0;

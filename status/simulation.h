@@ -13,8 +13,9 @@
 // What stands at a path.
 struct velm_entry {
     enum kind_t { absent, link, file, directory, other } kind = absent;
-    std::string text; // a link's target; a simulated file's content
-    int error = 0;    // why the path could not be looked up, or 0
+    std::string text;    // a link's target; a simulated file's content
+    int error = 0;       // why the path could not be looked up, or 0
+    bool shared = false; // a file with other names (hard links)
 };
 
 class velm_simulation final : public velm_system_calls {

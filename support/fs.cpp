@@ -49,12 +49,17 @@ velm_system_calls::write_file(const char* path, const std::string& text) const
 {
     // Not through a link, which could aim the write at any file of the
     // system, and not into a FIFO or a device: O_NONBLOCK makes a FIFO
-    // without a reader fail at once, and fstat tells the rest.
-    int fd = ::open(path, O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0666);
+    // without a reader fail at once, and fstat tells the rest. A file with
+    // another name (a hard link) is not this tool's either, so it is
+    // truncated only once it is known to be the record alone.
+    int fd = ::open(path, O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0666);
     if (fd < 0)
         return -1;
     struct stat st;
-    int result = fstat(fd, &st) == 0 && S_ISREG(st.st_mode) ? 0 : -1;
+    int result =
+        fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink == 1 && ftruncate(fd, 0) == 0
+            ? 0
+            : -1;
     for (size_t done = 0; result == 0 && done < text.size();) {
         ssize_t n = ::write(fd, text.data() + done, text.size() - done);
         result = n > 0 ? 0 : -1;

@@ -16,7 +16,6 @@
 #include <regex>
 #include <sched.h>
 #include <set>
-#include <sstream>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/wait.h>
@@ -31,43 +30,33 @@ const std::string failures = " openat:EACCES openat:ENOENT read:EIO write:ENOSPC
                              "readlink:ENOENT unlink:EROFS unlink:ENOENT symlink:EROFS rmdir:EROFS";
 const std::set<std::string> lasting = {"icutz-stale", "icutz-missing", "icutz-with-system"};
 
+// Counts of both workers, in memory they share.
 struct tally {
     int injected, lasting, cuts, same, different, broken, violations, statuses[256];
 } * t;
 std::string row_name;
+std::regex own; // every message the tool's sources hand to warn(3)
 
-// Every message the tool's sources hand to warn(3), with any errno text.
-std::regex
-own_messages()
+void
+violation(const std::string& how, const std::string& what)
 {
-    std::string all = "tzlinks: (", source;
-    const std::regex call("warn\\(\"([^\"]*)\""), special("[.^$|()\\[\\]{}*+?\\\\]");
-    for (const char* file : {"dataset/dataset.cpp", "dataset/icu.cpp", "dataset/zoneinfo.cpp",
-                             "driver/icu_migration.cpp", "driver/localtime.cpp",
-                             "driver/startup.cpp", "support/fs.cpp", "support/version.cpp"}) {
-        std::ifstream in(TZLINKS_SOURCE_DIR "/" + std::string(file));
-        source.assign(std::istreambuf_iterator<char>(in), {});
-        for (std::sregex_iterator m(source.begin(), source.end(), call), end; m != end; ++m)
-            all += std::regex_replace((*m)[1].str(), special, "\\$&") + "|";
-    }
-    all.back() = ')';
-    all = std::regex_replace(std::regex_replace(all, std::regex("%s"), ".*"), std::regex("%d"),
-                             "-?[0-9]+");
-    return std::regex(all + ": .*\n");
+    std::cout << "VIOLATION " + row_name + ": " + how + ": " + what + "\n" << std::flush;
+    ++t->violations;
 }
 
 outcome
 tzlinks(const std::string& inject = "")
 {
-    return run(inject.empty() ? std::vector<std::string>{TZLINKS_BINARY}
-                              : std::vector<std::string>{"strace", "-f", "-qq", "-o", "/dev/null",
-                                                         "-e", "inject=" + inject, TZLINKS_BINARY});
+    if (inject.empty())
+        return run({TZLINKS_BINARY});
+    return run(
+        {"strace", "-f", "-qq", "-o", "/dev/null", "-e", "inject=" + inject, TZLINKS_BINARY});
 }
 
-// Two runs settle the tree: after an update older than the system data was
-// adopted, the next run still resets to the system data. Then what
-// tzlinks-status finds wrong, notes aside, beyond what is expected: 0
-// nothing, 1 only lasting states, 2 more.
+// Two clean runs settle the tree (after an update older than the system
+// data was adopted, the next run still resets to the system data); then
+// what tzlinks-status finds wrong, notes aside, beyond what is expected:
+// 0 nothing, 1 only lasting states, 2 more.
 int
 settle(const std::set<std::string>& expected, std::set<std::string>* found = nullptr)
 {
@@ -78,30 +67,23 @@ settle(const std::set<std::string>& expected, std::set<std::string>* found = nul
     for (std::sregex_iterator m(report.begin(), report.end(), finding), end; m != end; ++m) {
         if (expected.count((*m)[1]) == 0)
             worse = std::max(worse, lasting.count((*m)[1]) != 0 ? 1 : 2);
-        if (found)
+        if (found != nullptr)
             found->insert((*m)[1]);
     }
     return worse;
 }
 
 void
-violation(const std::string& where, const std::string& what)
-{
-    std::cout << "VIOLATION " + row_name + ": " + where + ": " + what + "\n" << std::flush;
-    ++t->violations;
-}
-
-void
-inject(const std::string& how, const std::set<std::string>& expected, const std::regex& own)
+inject(const std::string& how, const std::set<std::string>& expected)
 {
     outcome o = tzlinks(how);
     std::string line, last, resort = "tzlinks: Last resort force_system_dataset() failed: ";
     for (std::istringstream lines(o.err); std::getline(lines, line); last = line) {
-        if (!std::regex_match(line + "\n", own))
+        if (!std::regex_match(line, own))
             violation(how, "not its own message: " + line);
     }
-    if (o.status != 0 && !(last.compare(0, resort.size(), resort) == 0 &&
-                           (o.status == 255 || last == resort + strerror(o.status))))
+    if (o.status != 0 && (last.compare(0, resort.size(), resort) != 0 ||
+                          (o.status != 255 && last != resort + strerror(o.status))))
         violation(how, "exit status " + std::to_string(o.status));
     int worse = settle(expected);
     if (worse == 2)
@@ -126,7 +108,7 @@ cut(const std::string& how, const std::set<std::string>& expected,
 }
 
 void
-try_row(const row& r, const std::regex& own)
+try_row(const row& r)
 {
     const std::string saved = "/tmp/tzlinks-faults." + std::to_string(getpid());
     const std::vector<std::string> restore = {"sh", "-c", "rm -rf /var/* && cp -a $0/. /var",
@@ -142,27 +124,46 @@ try_row(const row& r, const std::regex& own)
     std::ifstream trace(saved + ".trace");
     std::map<std::string, int> seen;
     bool started = false;
-    std::smatch m;
+    std::smatch call;
     for (std::string text; std::getline(trace, text);) {
-        if (!std::regex_search(text, m, std::regex("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += ")))
+        if (!std::regex_search(text, call, std::regex("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += ")))
             continue;
-        std::string name = m[1], when = std::to_string(++seen[name]), args = m[2];
+        std::string name = call[1], when = std::to_string(++seen[name]), args = call[2];
         started = started || args.find("/var/db/timezone") != std::string::npos;
         if (!started || (name == "write" && args.compare(0, 2, "2,") == 0))
             continue; // the loader's calls, and the warnings' own writes
         bool changes = name == "unlink" || name == "symlink" || name == "rmdir" ||
                        name == "write" || args.find("O_CREAT") != std::string::npos;
-        for (size_t at = 0; (at = failures.find(" " + name + ":", at)) != std::string::npos; ++at) {
-            std::string e = failures.substr(at + name.size() + 2,
-                                            failures.find(' ', at + 1) - at - name.size() - 2);
-            run(restore), inject(name + ":error=" + e + ":when=" + when, expected, own);
+        for (size_t at = 0; (at = failures.find(" " + name + ":", at)) != std::string::npos;) {
+            at += name.size() + 2;
+            std::string error = failures.substr(at, failures.find(' ', at) - at);
+            run(restore), inject(name + ":error=" + error + ":when=" + when, expected);
         }
         if (changes && name != "write")
-            run(restore), inject(name + ":error=EROFS:when=" + when + "+", expected, own);
+            run(restore), inject(name + ":error=EROFS:when=" + when + "+", expected);
         if (changes)
             run(restore), cut(name + ":signal=KILL:when=" + when, expected, reference);
     }
     run({"rm", "-rf", saved, saved + ".trace"});
+}
+
+// The messages of the tool's sources as one alternation: each format with
+// its %s and %d as patterns, the rest as it stands.
+std::string
+own_messages()
+{
+    std::string all, source;
+    const std::regex call("warn\\(\"([^\"]*)\""), special("[.^$|()\\[\\]{}*+?\\\\]");
+    for (const char* file : {"dataset/dataset.cpp", "dataset/icu.cpp", "dataset/zoneinfo.cpp",
+                             "driver/icu_migration.cpp", "driver/localtime.cpp",
+                             "driver/startup.cpp", "support/fs.cpp", "support/version.cpp"}) {
+        std::ifstream in(TZLINKS_SOURCE_DIR "/" + std::string(file));
+        source.assign(std::istreambuf_iterator<char>(in), {});
+        for (std::sregex_iterator m(source.begin(), source.end(), call), end; m != end; ++m)
+            all += (all.empty() ? "" : "|") + std::regex_replace((*m)[1].str(), special, "\\$&");
+    }
+    all = std::regex_replace(all, std::regex("%s"), ".*");
+    return std::regex_replace(all, std::regex("%d"), "-?[0-9]+");
 }
 
 } // namespace
@@ -173,26 +174,25 @@ run_faults()
 {
     t = static_cast<tally*>(mmap(nullptr, 2 * sizeof(tally), PROT_READ | PROT_WRITE,
                                  MAP_SHARED | MAP_ANONYMOUS, -1, 0));
+    own = std::regex("tzlinks: (" + own_messages() + "): .*");
     std::vector<row> rows = load_rows();
     for (size_t w = 0; w < 2; ++w) {
-        if (fork() == 0) {
-            t += w;
-            unshare(CLONE_NEWNS);
-            mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr);
-            std::regex own = own_messages();
-            for (size_t i = w; i < rows.size(); i += 2) {
-                if (rows[i].inject.empty())
-                    try_row(rows[i], own);
-            }
-            _exit(0);
+        if (fork() != 0)
+            continue;
+        t += w;
+        unshare(CLONE_NEWNS);
+        mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr);
+        for (size_t i = w; i < rows.size(); i += 2) {
+            if (rows[i].inject.empty())
+                try_row(rows[i]);
         }
+        _exit(0);
     }
     while (wait(nullptr) > 0) {
     }
     tally& a = t[0];
     a.injected += t[1].injected, a.lasting += t[1].lasting, a.cuts += t[1].cuts;
     a.same += t[1].same, a.different += t[1].different, a.broken += t[1].broken;
-    a.violations += t[1].violations;
     std::cout << "injected failures: " << a.injected << ", " << a.lasting
               << " of them leaving a documented lasting state\n  exit statuses:";
     for (int status = 0; status < 256; ++status) {
@@ -200,7 +200,7 @@ run_faults()
             std::cout << " " << status << " x" << a.statuses[status] + t[1].statuses[status];
     }
     std::cout << "\npower cuts: " << a.cuts << ": " << a.same << " same, " << a.different
-              << " working but different, " << a.broken << " broken\nfaults: " << a.violations
-              << " violations\n";
-    return a.violations == 0 ? 0 : 1;
+              << " working but different, " << a.broken
+              << " broken\nfaults: " << a.violations + t[1].violations << " violations\n";
+    return a.violations + t[1].violations == 0 ? 0 : 1;
 }

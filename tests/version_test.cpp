@@ -1,4 +1,4 @@
-// In-process: the version parse's worked cases, range errors and order
+// In-process: the version parse's fields, range errors and order
 // (tests/version.rows), which no end-to-end row can reach; and the two
 // hand-written matchers against std::regex with their own patterns, on
 // every text up to the length where each group has met each neighbour,
@@ -20,46 +20,34 @@ fields(const velm_version& v)
            std::to_string(v.minor2);
 }
 
-velm_version
-version_of(const std::string& text)
-{
-    return text == "-" ? velm_version() : velm_version(unescape(text));
-}
-
 TEST(version, rows)
 {
     std::ifstream rows(TZLINKS_SOURCE_DIR "/tests/version.rows");
+    auto version = [](const std::string& text) {
+        return text == "-" ? velm_version() : velm_version(unescape(text));
+    };
     for (std::string row; std::getline(rows, row);) {
-        std::string line = row[0] == '=' ? " " + row : row; // the empty text
-        size_t arrow = line.find(" => "), space = line.find(' ');
+        size_t arrow = row.find(" => "), space = row.find(' ');
         SCOPED_TRACE(row);
-        if (row.empty() || row[0] == '#') {
-            continue;
-        } else if (arrow == std::string::npos) { // A > B or A = B
-            velm_version a = version_of(line.substr(0, space)),
-                         b = version_of(line.substr(space + 3));
-            EXPECT_EQ(a > b, line[space + 1] == '>');
+        if (row[0] != '#' && arrow == std::string::npos) { // A > B, A = B
+            velm_version a = version(row.substr(0, space)), b = version(row.substr(space + 3));
+            EXPECT_EQ(a > b, row[space + 1] == '>');
             EXPECT_FALSE(b > a);
-            EXPECT_EQ(a == b, line[space + 1] == '=');
-            continue;
+            EXPECT_EQ(a == b, row[space + 1] == '=');
+        } else if (row[0] != '#') {
+            std::string text = unescape(row.substr(0, arrow)),
+                        expected = unescape(row.substr(arrow + 4));
+            velm_version parsed(std::string("1999zz.5.6"));
+            testing::internal::CaptureStderr();
+            try {
+                velm_version_parse(parsed, text);
+            } catch (const std::out_of_range&) {
+                expected.replace(0, 6, "");
+            }
+            std::string warned = testing::internal::GetCapturedStderr();
+            EXPECT_EQ(warned.empty(), expected != "no");
+            EXPECT_EQ(fields(parsed), expected == "no" ? "-1  -1 -1" : expected);
         }
-        std::string text = unescape(line.substr(0, arrow)),
-                    expected = unescape(line.substr(arrow + 4));
-        velm_version version(std::string("1999zz.5.6"));
-        std::string thrown, me = program_invocation_short_name;
-        errno = 0;
-        testing::internal::CaptureStderr();
-        try {
-            velm_version_parse(version, text);
-        } catch (const std::out_of_range&) {
-            thrown = "range ";
-        }
-        EXPECT_EQ(testing::internal::GetCapturedStderr(),
-                  expected != "no" ? ""
-                                   : me + ": Cannot parse version string " + text +
-                                         ", results.size() = 0: Success\n" + me +
-                                         ": Cannot parse version string " + text + ": Success\n");
-        EXPECT_EQ(thrown + fields(version), expected == "no" ? "-1  -1 -1" : expected);
     }
 }
 
