@@ -11,6 +11,13 @@
 
 static const char usage[] = "usage: tzlinks-status [--json] [--root DIR]\n"
                             "       tzlinks-status --help | --version\n";
+static const char help[] =
+    "Reports which time-zone data a device uses, what its next boot will do and what\n"
+    "is wrong, without changing anything.\n"
+    "  --json      one JSON object instead of text\n"
+    "  --root DIR  the tree below DIR (an image, a copy) instead of the device's own\n"
+    "Exit status: 0 healthy, 1 degraded, 2 broken, 64 usage, 66 DIR unreadable,\n"
+    "74 the report could not be written. See tzlinks-status(8).\n";
 
 static int
 usage_error(const char* why, const std::string& word)
@@ -35,6 +42,7 @@ main(int argc, char** argv)
             root = word.substr(7);
         } else if (word == "--help") {
             (void)fputs(usage, stdout);
+            (void)fputs(help, stdout);
             return 0;
         } else if (word == "--version") {
             printf("tzlinks-status %s\n", TZLINKS_VERSION);
@@ -52,5 +60,9 @@ main(int argc, char** argv)
     velm_simulation tree(root_fd);
     velm_report report = make_report(tree);
     (void)fputs((as_json ? json_report(report) : text_report(report)).c_str(), stdout);
+    if (fflush(stdout) != 0 || ferror(stdout) != 0) {
+        warn("cannot write the report");
+        return 74;
+    }
     return report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2;
 }

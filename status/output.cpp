@@ -123,62 +123,60 @@ json_report(const velm_report& r)
 }
 
 static std::string
-line(const std::string& label, const std::string& text)
+link(const char* name, const velm_text& target)
 {
-    return "  " + label + std::string(label.size() < 11 ? 11 - label.size() : 1, ' ') +
-           printable(text) + "\n";
-}
-
-static std::string
-link(const velm_text& target)
-{
-    return target ? "-> " + *target : "(none)";
+    return "  " + std::string(name) + (target ? " -> " + printable(*target) : ": no link") + "\n";
 }
 
 static std::string
 dataset(const velm_dataset_facts& d)
 {
-    if (!d.present)
-        return "(none understood)";
-    return (d.root.empty() ? "system data " : "update ") + d.version +
+    return (d.root.empty() ? "the system data " : "update ") + printable(d.version) +
            (d.version_understood ? "" : " (not a version)") + ", ICU schema " +
-           (d.icu_schema.empty() ? "(none)" : d.icu_schema);
+           (d.icu_schema.empty() ? "none" : printable(d.icu_schema));
+}
+
+static const char*
+what_it_does(const std::string& action)
+{
+    return action == "adopt"   ? "It adopts the update tz_latest names."
+           : action == "reset" ? "It resets the device to the system data."
+           : action == "keep"  ? "It keeps the data in use."
+                               : "It fails: not even the system data can be linked.";
 }
 
 std::string
 text_report(const velm_report& r)
 {
     const auto& next = r.next_boot;
-    std::string out = "now\n";
-    out += line("in use", dataset(r.live));
-    out += line("system", dataset(r.system));
-    out += line("latest", r.latest.present
-                              ? dataset(r.latest) +
-                                    (r.latest.compatible ? ", compatible" : ", incompatible") +
-                                    (r.latest.newer ? ", newer" : ", not newer")
-                              : "(none understood)");
-    out += line("zoneinfo", link(r.zoneinfo));
-    out += line("icutz", link(r.icutz));
-    out +=
-        line("localtime", link(r.localtime) +
-                              (r.localtime_zone.empty() ? "" : " (zone " + r.localtime_zone + ")"));
-    out += line("tz_latest", link(r.tz_latest));
-    out += line("record", r.record ? *r.record : "(none)");
-    out += "next boot\n";
-    out += line("does", next.action == "adopt"   ? "adopts " + r.latest.version
-                        : next.action == "reset" ? "resets to the system data"
-                        : next.action == "keep"  ? "keeps the data in use"
-                                                 : "fails: not even the system data can be linked");
-    out += line("zoneinfo", link(next.zoneinfo));
-    out += line("icutz", link(next.icutz));
-    out += line("localtime", link(next.localtime));
-    out += line("record", next.record ? *next.record + " (written)" : "(left as it is)");
+    std::string out =
+        "Now\n  In use: " +
+        (r.live.present ? dataset(r.live) : std::string("no data the boot tool understands")) +
+        ".\n  System: " +
+        (r.system.present ? dataset(r.system) : std::string("none that can be read")) + ".\n";
+    if (r.latest.present)
+        out += "  Latest: " + dataset(r.latest) + "; " +
+               (r.latest.compatible ? "compatible with" : "incompatible with") +
+               " the system data, " + (r.latest.newer ? "newer" : "not newer") +
+               " than the data in use.\n";
+    out += link("zoneinfo", r.zoneinfo) + link("icutz", r.icutz) + link("localtime", r.localtime) +
+           link("tz_latest", r.tz_latest);
+    if (!r.localtime_zone.empty())
+        out += "  The zone is " + printable(r.localtime_zone) + ".\n";
+    out += r.record ? "  The record of the last adoption reads " + printable(*r.record) + ".\n"
+                    : "  There is no record of an adoption.\n";
+    out += "Next boot\n  " + std::string(what_it_does(next.action)) + "\n" +
+           link("zoneinfo", next.zoneinfo) + link("icutz", next.icutz) +
+           link("localtime", next.localtime);
+    out += next.record ? "  It records " + printable(*next.record) + ".\n"
+                       : "  It leaves the record as it is.\n";
     for (const std::string& message : next.messages)
-        out += line("says", message);
+        out += "  It says: " + printable(message) + "\n";
     if (next.exit_status != 0)
-        out += line("exits", std::to_string(next.exit_status));
-    out += r.findings.empty() ? "findings\n  (none)\n" : "findings\n";
+        out += "  It exits with status " + std::to_string(next.exit_status) + ".\n";
+    out += r.findings.empty() ? "Findings: none.\n" : "Findings\n";
     for (const velm_finding& f : r.findings)
-        out += line(f.severity, f.id + ": " + f.message) + line("", "repair: " + f.repair);
-    return out + "health: " + r.health + "\n";
+        out += "  " + f.severity + " " + f.id + ": " + printable(f.message) +
+               "\n    Repair: " + f.repair + ".\n";
+    return out + "Health: " + r.health + ".\n";
 }

@@ -129,7 +129,10 @@ TEST(status, command_line)
     const std::string usage = "usage: tzlinks-status [--json] [--root DIR]\n"
                               "       tzlinks-status --help | --version\n";
     const std::tuple<std::vector<std::string>, int, std::string, std::string> uses[] = {
-        {{"--help"}, 0, usage, ""},
+        {{"--help"},
+         0,
+         usage + "Reports which time-zone data a device uses, what its next boot",
+         ""},
         {{"--version"}, 0, "tzlinks-status " TZLINKS_VERSION "\n", ""},
         {{"-x"}, 64, "", "tzlinks-status: unknown argument: -x\n" + usage},
         {{"--json", "--root"}, 64, "", "tzlinks-status: missing directory after: --root\n" + usage},
@@ -142,7 +145,8 @@ TEST(status, command_line)
     for (const auto& [args, status, out, err] : uses) {
         outcome o = run(program(TZLINKS_STATUS_BINARY, args));
         EXPECT_EQ(o.status, status);
-        EXPECT_EQ(o.out, out);
+        EXPECT_EQ(o.out.substr(0, out.size()), out);
+        EXPECT_EQ(o.out.empty(), out.empty());
         EXPECT_EQ(o.err, err);
     }
     if (!sandbox_refused.empty())
@@ -150,7 +154,11 @@ TEST(status, command_line)
     ASSERT_TRUE(fresh_tree());
     ASSERT_TRUE(build_tree("system_dataset 2023c 44l; live_system\n"
                            "relink tz_latest \"$(printf '/x\\303\\251\\377\\001')\""));
-    EXPECT_NE(run(program(TZLINKS_STATUS_BINARY)).out.find("tz_latest  -> /xé\\xff\\x01\n"),
+    std::string full;
+    for (const std::string& word : program(TZLINKS_STATUS_BINARY, {}))
+        full += word + " ";
+    EXPECT_EQ(run({"sh", "-c", full + ">/dev/full"}).status, 74);
+    EXPECT_NE(run(program(TZLINKS_STATUS_BINARY)).out.find("  tz_latest -> /xé\\xff\\x01\n"),
               std::string::npos);
     EXPECT_NE(run(program(TZLINKS_STATUS_BINARY, {"--json"}))
                   .out.find("\"tz_latest\":\"/xé\\udcff\\u0001\""),
