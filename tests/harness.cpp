@@ -59,13 +59,30 @@ build_tree(const std::string& commands)
                .status == 0;
 }
 
+static std::vector<std::string>
+words(const std::string& text)
+{
+    std::istringstream split(text);
+    return {std::istream_iterator<std::string>(split), {}};
+}
+
 std::vector<std::string>
 program(const std::string& path, std::vector<std::string> args)
 {
-    std::istringstream words(runner ? runner : "");
-    std::vector<std::string> argv{std::istream_iterator<std::string>(words), {}};
+    std::vector<std::string> argv = words(runner ? runner : "");
     argv.push_back(path);
     argv.insert(argv.end(), args.begin(), args.end());
+    return argv;
+}
+
+std::vector<std::string>
+tzlinks(const std::string& inject)
+{
+    std::vector<std::string> argv, tool = program(TZLINKS_BINARY);
+    if (!inject.empty())
+        argv =
+            words("strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=" + inject);
+    argv.insert(argv.end(), tool.begin(), tool.end());
     return argv;
 }
 
@@ -232,16 +249,12 @@ changes(std::map<std::string, std::string> before, const std::map<std::string, s
     return changed;
 }
 
-int run_faults();
-
 int
 main(int argc, char** argv)
 {
     // Before gtest or anything else can start a thread: a process with
     // more than one thread cannot enter a new user namespace.
     sandbox_refused = enter_sandbox();
-    if (argc == 2 && std::string(argv[1]) == "--faults")
-        return sandbox_refused.empty() ? run_faults() : (puts(sandbox_refused.c_str()), 1);
     ::testing::InitGoogleTest(&argc, argv);
     return RUN_ALL_TESTS();
 }

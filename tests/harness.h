@@ -25,6 +25,9 @@ outcome run(std::vector<std::string> argv);
 // A program of the project, started through $TZLINKS_RUNNER's words (an
 // emulator, or valgrind), with arguments.
 std::vector<std::string> program(const std::string& path, std::vector<std::string> args = {});
+// tzlinks, under strace failing calls as inject says (its inject= expression)
+// when that is not empty; leak checks cannot run under ptrace.
+std::vector<std::string> tzlinks(const std::string& inject = "");
 
 // Every entry below /var and /usr/share, by path: "->target" for a link,
 // "=content" for a file, "/" for a directory, "|" for anything else; with
@@ -37,6 +40,8 @@ struct row {
     int exit = 0;
 };
 std::vector<row> load_rows();
+// The fault and power-cut runs of a row, from its tree kept at pristine.
+void try_faults(const std::string& pristine);
 // \s a space, \n a line end, \*N:c the character c N times.
 std::string unescape(const std::string& text);
 // What changed between two snapshots, in the rows' notation.
