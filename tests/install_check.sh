@@ -23,6 +23,7 @@ diff - <(echo "$staged") >&2 <<'END' || { echo "staged files differ (<expected >
 ./usr/sbin/tzlinks-status
 ./usr/share/doc/tzlinks/changelog.gz
 ./usr/share/doc/tzlinks/copyright
+./usr/share/lintian/overrides/tzlinks
 ./usr/share/man/man8/tzlinks-status.8.gz
 ./usr/share/man/man8/tzlinks.8.gz
 END
