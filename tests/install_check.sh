@@ -1,8 +1,10 @@
 #!/usr/bin/env bash
 # Installs a fresh release build of the sources (linked as shipped, stripped)
 # into a staging root, checks that exactly the package's files land there, so
-# that no test scaffolding ever reaches a device, and that systemd-analyze
-# accepts the installed boot unit. All below one temporary directory.
+# that no test scaffolding ever reaches a device, that systemd-analyze
+# accepts the installed boot unit, and that mandoc's linter finds no mistake
+# (warning level: not mere style notices) in the manuals. All below one
+# temporary directory.
 #
 # Usage: tests/install_check.sh SOURCE_DIR [CMAKE_CONFIGURE_ARG ...]
 set -euo pipefail
@@ -33,4 +35,6 @@ END
 MANPATH=$work/stage/usr/share/man quiet systemd-analyze verify --root="$work/stage" \
     "$work/stage/lib/systemd/system/tzlinks.service"
 [ ! -s "$work/log" ] || { cat "$work/log" >&2; exit 1; }
-echo "staged as expected; systemd-analyze verify: clean"
+quiet mandoc -Tlint -W warning "$src"/docs/*.8
+[ ! -s "$work/log" ] || { cat "$work/log" >&2; exit 1; }
+echo "staged as expected; systemd-analyze verify and mandoc -Tlint: clean"
