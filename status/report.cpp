@@ -58,9 +58,9 @@ link_at(const velm_simulation& tree, const std::string& path)
 }
 
 static velm_text
-file_at(const velm_simulation& tree, const std::string& path)
+file_at(const velm_simulation& tree, const std::string& path, bool follow = false)
 {
-    if (tree.look(path).kind != velm_entry::file)
+    if (tree.look(path, follow).kind != velm_entry::file)
         return std::nullopt;
     std::string text;
     int fd = tree.open_for_reading(path.c_str(), 0);
@@ -185,13 +185,14 @@ look_now(const velm_simulation& tree)
         return tree.look(path, follow).kind;
     };
     velm_entry record = tree.look(record_path);
-    velm_now now = {kind(system_zoneinfo, true) == velm_entry::directory,
-                    kind("/var/db/timezone/zoneinfo", true) == velm_entry::directory,
-                    kind("/var/db/timezone/localtime", true) == velm_entry::file,
-                    kind("/var/db/timezone/tz_latest", false) != velm_entry::absent,
-                    record.kind != velm_entry::absent &&
-                        (record.kind != velm_entry::file || record.shared),
-                    {}};
+    velm_now now = {
+        kind(system_zoneinfo, true) == velm_entry::directory,
+        kind("/var/db/timezone/zoneinfo", true) == velm_entry::directory,
+        // A zone file begins with the magic of the compiled format.
+        file_at(tree, "/var/db/timezone/localtime", true).value_or("").compare(0, 4, "TZif") == 0,
+        kind("/var/db/timezone/tz_latest", false) != velm_entry::absent,
+        record.kind != velm_entry::absent && (record.kind != velm_entry::file || record.shared),
+        {}};
     for (const char* legacy : {"/var/db/icutz", "/var/db/icu"}) {
         if (tree.look(legacy).kind != velm_entry::absent)
             now.legacy.insert(legacy);
@@ -346,6 +347,17 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
             std::string(record_path) +
                 " is no regular file of its own: no adoption is ever recorded there.",
             std::string("remove ") + record_path);
+    // An adoption writes the record last: cut short, or failed, it leaves
+    // the record of an earlier one. (No record at all is what an image
+    // made with an update in place looks like.)
+    std::string adopted = "_" + r.live.version;
+    if (next.action == "keep" && !update.empty() && r.live.present && r.record &&
+        (r.record->size() < adopted.size() ||
+         r.record->compare(r.record->size() - adopted.size(), std::string::npos, adopted) != 0))
+        add(r, "note", "record-stale",
+            "The record reads \"" + *r.record + "\", which does not name the adoption of " +
+                r.live.version + ", the update in use.",
+            "none needed: the next adoption writes it anew");
     for (const char* legacy : {"/var/db/icutz", "/var/db/icu"}) {
         if (now.legacy.count(legacy) != 0)
             add(r, "note", "legacy-entries",
