@@ -368,6 +368,26 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
     }
 }
 
+// The boot after the next one, on what the next one leaves. An update
+// older than the system data is adopted when the data in use is older
+// still, and the following boot sets it aside again.
+static void
+find_unsettled(const velm_simulation& tree, velm_report& r)
+{
+    if (r.next_boot.exit_status != 0)
+        return;
+    as_tzlinks([] {
+        errno = 0;
+        (void)run_startup_sequence();
+    });
+    velm_text zoneinfo = link_at(tree, "/var/db/timezone/zoneinfo");
+    if (zoneinfo != r.next_boot.zoneinfo)
+        add(r, "warning", "unsettled",
+            "The boot after the next one links zoneinfo to " + quoted(zoneinfo) +
+                " in turn: the next boot adopts data that the one after sets aside.",
+            "point tz_latest at an update that is not older than the system data");
+}
+
 velm_report
 make_report(velm_simulation& tree)
 {
@@ -381,6 +401,7 @@ make_report(velm_simulation& tree)
     find_data_problems(now, r);
     simulate_next_boot(tree, r);
     find_link_problems(tree, now, r);
+    find_unsettled(tree, r);
     tree.reset();
     use_system_calls(real);
     r.health = "healthy";
