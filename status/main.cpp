@@ -27,6 +27,17 @@ usage_error(const char* why, const std::string& word)
     return 64;
 }
 
+// What was written to standard output must have got there: a report that
+// cannot be written is an error of its own.
+static int
+written(int status)
+{
+    if (fflush(stdout) == 0 && ferror(stdout) == 0)
+        return status;
+    warn("cannot write the report");
+    return 74;
+}
+
 int
 main(int argc, char** argv)
 {
@@ -43,10 +54,10 @@ main(int argc, char** argv)
         } else if (word == "--help") {
             (void)fputs(usage, stdout);
             (void)fputs(help, stdout);
-            return 0;
+            return written(0);
         } else if (word == "--version") {
-            printf("tzlinks-status %s\n", TZLINKS_VERSION);
-            return 0;
+            (void)printf("tzlinks-status %s\n", TZLINKS_VERSION);
+            return written(0);
         } else {
             return usage_error(word == "--root" ? "missing directory after" : "unknown argument",
                                word);
@@ -60,9 +71,5 @@ main(int argc, char** argv)
     velm_simulation tree(root_fd);
     velm_report report = make_report(tree);
     (void)fputs((as_json ? json_report(report) : text_report(report)).c_str(), stdout);
-    if (fflush(stdout) != 0 || ferror(stdout) != 0) {
-        warn("cannot write the report");
-        return 74;
-    }
-    return report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2;
+    return written(report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2);
 }

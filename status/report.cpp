@@ -327,7 +327,8 @@ find_link_problems(const velm_simulation& tree, const velm_now& now, velm_report
             "icutz is there while the system data is in use: ICU readers use data that is "
             "not the system's, and no boot changes that.",
             remove_zoneinfo);
-    bool next_usable = tree.look("/var/db/timezone/localtime", true).kind == velm_entry::file;
+    bool next_usable =
+        file_at(tree, "/var/db/timezone/localtime", true).value_or("").compare(0, 4, "TZif") == 0;
     if (!now.localtime_usable || !r.localtime)
         add(r, "error", "localtime-unusable",
             "localtime names " + quoted(r.localtime) + ", which is no link to a zone file; " +

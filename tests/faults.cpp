@@ -22,9 +22,10 @@ namespace {
 
 // The failures each call meets on a device; ENOENT where it means
 // something of its own to the tool.
-const std::string failures = " openat:EACCES openat:ENOENT read:EIO write:ENOSPC close:EIO "
-                             "fstat:EIO newfstatat:EIO getdents64:EIO access:EACCES readlink:EIO "
-                             "readlink:ENOENT unlink:EROFS unlink:ENOENT symlink:EROFS rmdir:EROFS";
+const std::string failures =
+    " openat:EACCES openat:ENOENT read:EIO write:ENOSPC close:EIO "
+    "fstat:EIO newfstatat:EIO getdents64:EIO access:EACCES readlink:EIO "
+    "readlink:ENOENT unlink:EROFS unlink:ENOENT symlink:EROFS rmdir:EROFS ftruncate:EIO";
 const std::set<std::string> lasting = {"icutz-stale", "icutz-missing", "icutz-with-system"};
 
 // Every message the tool's sources hand to warn(3), each format's %s and
@@ -127,13 +128,14 @@ try_faults(const std::string& pristine)
         if (!started || (name == "write" && args.compare(0, 2, "2,") == 0))
             continue; // the loader's calls, and the warnings' own writes
         bool changes = name == "unlink" || name == "symlink" || name == "rmdir" ||
-                       name == "write" || args.find("O_CREAT") != std::string::npos;
+                       name == "ftruncate" || name == "write" ||
+                       args.find("O_CREAT") != std::string::npos;
         for (size_t at = 0; (at = failures.find(" " + name + ":", at)) != std::string::npos;) {
             at += name.size() + 2;
             std::string error = failures.substr(at, failures.find(' ', at) - at);
             run(restore), inject(name + ":error=" + error + ":when=" + when, expected, c);
         }
-        if (changes && name != "write")
+        if (changes && name != "write" && name != "ftruncate")
             run(restore), inject(name + ":error=EROFS:when=" + when + "+", expected, c);
         if (changes)
             run(restore), cut(name + ":signal=KILL:when=" + when, expected, reference, c);
