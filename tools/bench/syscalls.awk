@@ -3,17 +3,27 @@
 #   startup  process start-up, before the tool's first own call (loader,
 #            C library initialisation), compared separately with an empty
 #            program;
-#   needed   a call the tool's behaviour asks for;
-#   extra    anything else, with its cause.
-# With -v mode=list it prints each call after start-up with its kind and
-# reason; with -v mode=extras the reason of each extra call; otherwise one
-# line per kind: KIND COUNT.
+#   needed   a call the tool's behaviour asks for, with what it is for;
+#   extra    anything else, with its cause (the target is none).
+# A call is "needed" only where it belongs: reads, stats and closes only on
+# a descriptor the tool opened for that purpose, fstatat in the ICU
+# directory only for a name that has the form of ICU data.
+#
+# Modes (-v mode=...):
+#   (none)   one line per kind: KIND COUNT
+#   list     each call after start-up: kind, call, reason
+#   extras   the cause of each extra call, one a line
+#   purposes one line per purpose: PURPOSE COUNT (needed calls only)
 # Portable awk (mawk), as on a fresh Debian machine.
 
-function quoted(text,    start) {
-    if (!match(text, /"[^"]*"/))
-        return ""
-    return substr(text, RSTART + 1, RLENGTH - 2)
+function quoted(text, nth,    i) {
+    for (i = 1; i <= nth; i++) {
+        if (!match(text, /"[^"]*"/))
+            return ""
+        if (i == nth)
+            return substr(text, RSTART + 1, RLENGTH - 2)
+        text = substr(text, RSTART + RLENGTH)
+    }
 }
 
 function result(text) {
@@ -28,27 +38,62 @@ function first_arg(text) {
     return text
 }
 
-function note(kind, reason) {
+# purpose: the group a needed call is counted under; reason: the detail.
+function note(kind, purpose, reason) {
     count[kind]++
+    if (kind == "needed")
+        by_purpose[purpose]++
     if (mode == "list")
-        printf "%-7s %-58s %s\n", kind, substr(call, 1, 58), reason
+        printf "%-6s %-60s %s\n", kind, substr(call, 1, 60), reason
     if (mode == "extras" && kind == "extra")
         print reason
 }
 
-# Reason for a file opened by the tool, from its path.
-function file_reason(path) {
-    if (path == "/var/db/timezone/" || path == "/var/db/timezone/tz/")
-        return "data-protection class: open and close the directory"
-    if (path ~ /\+VERSION$/)
-        return "read the tz version (+VERSION)"
-    if (path ~ /icutzformat\.txt$/)
-        return "read the system ICU schema (icutzformat.txt)"
-    if (path ~ /TZVersionDiffRecord$/)
-        return "write the version diff record"
-    if (path == "." || path ~ /\/icutz$/)
-        return "ICU directory walk (fts)"
+function extra(cause) { note("extra", "", cause) }
+
+# What a descriptor the tool opens is for, from the path and flags.
+function opened_for(path, flags) {
+    if ((path == "/var/db/timezone/" || path == "/var/db/timezone/tz/") && flags !~ /O_WRONLY|O_RDWR/)
+        return "data protection"
+    if ((path ~ /\/\+VERSION$/ || path ~ /\/icutzformat\.txt$/) && flags ~ /O_NONBLOCK/ &&
+        flags !~ /O_WRONLY|O_RDWR|O_DIRECTORY/)
+        return "first word"
+    if (path ~ /\/icutz$/ && flags ~ /O_DIRECTORY/ && flags ~ /O_NONBLOCK/)
+        return "ICU directory"
+    if (path ~ /\/TZVersionDiffRecord$/ && flags ~ /O_WRONLY/ && flags ~ /O_NOFOLLOW/)
+        return "record"
     return ""
+}
+
+# The calls each kind of descriptor is opened for; anything else on it is
+# extra.
+function allowed(what, name) {
+    if (what == "data protection")
+        return name == "close" || name == "fcntl"
+    if (what == "first word")
+        return name == "fstat" || name == "read" || name == "close"
+    if (what == "ICU directory")
+        return name == "getdents64" || name == "fstatat" || name == "close"
+    if (what == "record")
+        return name == "fstat" || name == "ftruncate" || name == "write" || name == "close"
+    return 0
+}
+
+function detail(what, name, path) {
+    if (what == "data protection")
+        return name == "open" ? "data-protection class: open " path : \
+            name == "fcntl" ? "data-protection class: set it" : "data-protection class: close"
+    if (what == "first word")
+        return name == "open" ? "first word of " path ": open" : \
+            name == "fstat" ? "first word: fstat (a regular file?)" : "first word: " name
+    if (what == "ICU directory")
+        return name == "open" ? "ICU directory " path ": open" : \
+            name == "getdents64" ? "ICU directory: read names" : \
+            name == "fstatat" ? "ICU directory: fstatat the matching name " path : "ICU directory: close"
+    if (what == "record")
+        return name == "open" ? "version diff record: open (no link followed)" : \
+            name == "fstat" ? "version diff record: fstat (a regular file, one name?)" : \
+            "version diff record: " name
 }
 
 {
@@ -65,48 +110,72 @@ call ~ /^\+\+\+|^---|resumed>/ { next }
 {
     name = call
     sub(/\(.*/, "", name)
-    path = quoted(call)
+    path = quoted(call, 1)
+    fd = first_arg(call)
 }
+# fstat(2) is newfstatat(fd, "", ..., AT_EMPTY_PATH) in glibc 2.33 and later.
+name == "newfstatat" && fd != "AT_FDCWD" && path == "" && call ~ /AT_EMPTY_PATH/ { name = "fstat" }
+name == "newfstatat" && fd != "AT_FDCWD" && path != "" { name = "fstatat" }
 name == "openat" {
-    reason = file_reason(path)
-    if (reason == "") {
-        note("extra", "UNEXPLAINED open")
+    what = opened_for(path, call)
+    if (what == "") {
+        extra("open of " path " for no known purpose")
         next
     }
-    fd[result(call)] = reason
-    note("needed", reason)
+    if (result(call) ~ /^[0-9]+$/)
+        open_fd[result(call)] = what
+    note("needed", what, detail(what, "open", path))
     next
 }
-name == "close" || name == "read" || name == "fchdir" || name == "getdents64" || \
-    (name == "write" && first_arg(call) != "2") || \
-    (name == "newfstatat" && first_arg(call) != "AT_FDCWD") {
-    reason = fd[first_arg(call)]
-    if (reason == "") {
-        note("extra", "UNEXPLAINED call on an unknown descriptor")
+name == "close" || name == "read" || name == "fstat" || name == "fstatat" || \
+    name == "getdents64" || name == "ftruncate" || name == "fcntl" || (name == "write" && fd != "2") {
+    what = open_fd[fd]
+    if (what == "") {
+        extra(name " on descriptor " fd ", which the tool did not open")
         next
     }
-    note("needed", reason)
+    if (!allowed(what, name)) {
+        extra(name " on the " what " descriptor, which does not need it")
+        next
+    }
+    if (name == "fstatat" && path !~ /^icutz[0-9]+[lbe]\.dat$/) {
+        extra("fstatat of " path " in the ICU directory, a name that is not ICU data")
+        next
+    }
+    if (name == "close")
+        delete open_fd[fd]
+    note("needed", what, detail(what, name, path))
     next
 }
-name == "newfstatat" && path ~ /\/icutz$/ { note("needed", "ICU directory walk (fts): the root"); next }
-name == "newfstatat" && call ~ /AT_SYMLINK_NOFOLLOW/ { note("needed", "ICU directory walk (fts): one entry"); next }
-name == "write" { note("needed", "warning on standard error (warn(3))"); next }
-name == "access" && path == "/var/db/icutz" { note("needed", "legacy ICU link migration: old link there?"); next }
-name == "access" && path == "/var/db/timezone/icutz" { note("needed", "legacy ICU link migration: new link there?"); next }
-name == "access" { note("needed", "existence test of " path); next }
-(name == "unlink" || name == "rmdir") && path == "/var/db/icu" { note("needed", "remove(3) of /var/db/icu"); next }
-name == "unlink" { note("needed", "remove link " path); next }
-name == "readlink" { note("needed", "read link " path); next }
-name == "symlink" { note("needed", "create link " path); next }
-name == "exit_group" { note("needed", "exit"); next }
-name == "futex" { note("extra", "libstdc++ locale initialisation (pthread_once wakes waiters)"); next }
-name == "brk" || name == "mmap" || name == "munmap" {
-    note("extra", "malloc: heap grows for the walk's directory buffer, then trims")
+name == "write" { note("needed", "warnings", "warning on standard error (warn(3): name, message, error text)"); next }
+name == "access" && path == "/var/db/icutz" {
+    note("needed", "links", "legacy ICU link: does /var/db/icutz resolve?")
     next
 }
-{ note("extra", "UNEXPLAINED") }
+name == "access" && path == "/var/db/timezone/icutz" {
+    note("needed", "links", "legacy ICU link: does the new one resolve?")
+    next
+}
+name == "access" { note("needed", "links", "does " path " resolve?"); next }
+(name == "unlink" || name == "rmdir") && path == "/var/db/icu" {
+    note("needed", "links", "remove(3) of the old /var/db/icu")
+    next
+}
+name == "unlink" { note("needed", "links", "remove " path); next }
+name == "readlink" { note("needed", "links", "read link " path); next }
+name == "symlink" { note("needed", "links", "create link " quoted(call, 2)); next }
+name == "exit_group" { note("needed", "exit", "exit"); next }
+name == "futex" {
+    extra("futex: a pthread_once ends and wakes waiters (one-time set-up in a shared library, such as libgcc_s's unwinder on the first throw)")
+    next
+}
+name == "brk" || name == "mmap" || name == "munmap" { extra(name ": malloc grows or trims the heap"); next }
+{ extra(name ": unexplained") }
 
 END {
     if (mode == "")
         printf "startup %d\nneeded %d\nextra %d\n", count["startup"], count["needed"], count["extra"]
+    if (mode == "purposes")
+        for (p in by_purpose)
+            printf "%s\t%d\n", p, by_purpose[p]
 }
