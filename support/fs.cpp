@@ -55,11 +55,14 @@ velm_system_calls::write_file(const char* path, const std::string& text) const
     int fd = ::open(path, O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0666);
     if (fd < 0)
         return -1;
+    // An empty file, as a new one is, needs no truncating; and truncating
+    // one makes some file systems write it out at close, which is felt at
+    // boot.
     struct stat st;
-    int result =
-        fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink == 1 && ftruncate(fd, 0) == 0
-            ? 0
-            : -1;
+    int result = fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink == 1 &&
+                         (st.st_size == 0 || ftruncate(fd, 0) == 0)
+                     ? 0
+                     : -1;
     for (size_t done = 0; result == 0 && done < text.size();) {
         ssize_t n = ::write(fd, text.data() + done, text.size() - done);
         result = n > 0 ? 0 : -1;
