@@ -17,7 +17,7 @@ static const char version_diff_record[] = "/var/db/timezone/TZVersionDiffRecord"
 static void
 write_version_diff_record(const std::string& before, const std::string& adopted)
 {
-    (void)system_calls().write_file(version_diff_record, before + "_" + adopted);
+    system_calls().write_file(version_diff_record, before + "_" + adopted);
 }
 
 // Reads the zoneinfo link; a link that is missing or not understood puts

@@ -65,10 +65,9 @@ file_at(const velm_simulation& tree, const std::string& path, bool follow = fals
     std::string text;
     int fd = tree.open_for_reading(path.c_str(), 0);
     char buffer[4096];
-    for (ssize_t n; fd >= 0 && (n = read(fd, buffer, sizeof buffer)) > 0;)
+    for (ssize_t n; (n = read(fd, buffer, sizeof buffer)) > 0;) // none from no file
         text.append(buffer, static_cast<size_t>(n));
-    if (fd >= 0)
-        close(fd);
+    (void)close(fd);
     return text;
 }
 
@@ -220,12 +219,11 @@ find_unreadable(const velm_simulation& tree, velm_report& r)
     // An update's ICU directory is read, not only looked up.
     for (const std::string& root : {r.live.root, r.latest.root}) {
         int fd = root.empty() ? -1 : tree.open_for_reading((root + "/icutz").c_str(), O_DIRECTORY);
-        if (fd >= 0)
-            close(fd);
-        else if (!root.empty() && seen.insert(errno).second)
+        if (!root.empty() && fd < 0 && seen.insert(errno).second)
             add(r, "warning", "unreadable",
                 root + "/icutz cannot be read: " + strerror(errno) + ".",
                 "make it readable, or remove it");
+        (void)close(fd);
     }
 }
 

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -67,7 +68,6 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
     }
     push(path);
     bool must_be_directory = path.back() == '/';
-    canonical.clear();
     velm_entry entry;
     entry.kind = velm_entry::directory;
     for (int links = 0; !todo.empty();) {
@@ -192,24 +192,18 @@ velm_simulation::symlink(
     return 0;
 }
 
+// The simulated run removes nothing below a directory before it removes
+// the directory itself, so what the directory really holds decides.
 bool
 velm_simulation::empty_directory(const std::string& canonical) const
 {
-    for (const auto& [path, entry] : changed) {
-        if (entry.kind != velm_entry::absent &&
-            path.compare(0, canonical.size() + 1, canonical + "/") == 0)
-            return false;
-    }
     int fd =
         openat(root, relative(canonical).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
     DIR* directory = fd < 0 ? nullptr : fdopendir(fd);
     bool empty = directory != nullptr;
     // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* child = empty ? readdir(directory) : nullptr) {
-        std::string name = child->d_name, path = canonical;
-        if (name != "." && name != "..")
-            empty = entry_at(path.append("/").append(name)).kind == velm_entry::absent;
-    }
+    while (const struct dirent* child = empty ? readdir(directory) : nullptr)
+        empty = strcmp(child->d_name, ".") == 0 || strcmp(child->d_name, "..") == 0;
     if (directory != nullptr)
         closedir(directory);
     return empty;
@@ -249,27 +243,26 @@ velm_simulation::open_for_reading(const char* path, int flags) const
     return fd;
 }
 
-int
+// What the real call leaves in errno, too: the error of an open that
+// fails (O_NOFOLLOW refuses a link, a FIFO without a reader refuses a
+// writer), untouched when the open works.
+void
 velm_simulation::write_file(const char* path, const std::string& text) const
 {
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0)
-        return fail(entry.error);
-    if (entry.kind == velm_entry::link || entry.kind == velm_entry::directory ||
-        entry.kind == velm_entry::other)
-        return fail(entry.kind == velm_entry::link        ? ELOOP
-                    : entry.kind == velm_entry::directory ? EISDIR
-                                                          : ENXIO);
-    if (entry.shared) { // the real call opens it, and finds another name
-        errno = saved;
-        return -1;
+    int error = entry.error != 0                      ? entry.error
+                : entry.kind == velm_entry::link      ? ELOOP
+                : entry.kind == velm_entry::directory ? EISDIR
+                : entry.kind == velm_entry::other     ? ENXIO
+                                                      : 0;
+    errno = error != 0 ? error : saved;
+    // A file with other names is opened, then left alone.
+    if (error == 0 && !entry.shared) {
+        changed[canonical] = velm_entry{velm_entry::file, text, 0, false};
+        writes[canonical] = true;
     }
-    changed[canonical] = velm_entry{velm_entry::file, text, 0, false};
-    writes[canonical] = true;
-    errno = saved;
-    return 0;
 }
 
 void
@@ -277,7 +270,5 @@ velm_simulation::set_protection_class(const char* path, int /*protection_class*/
 {
     // Opened and closed as the real call does, for what that leaves in
     // errno; the class itself is never set.
-    int fd = open_for_reading(path, 0);
-    if (fd >= 0)
-        close(fd);
+    (void)close(open_for_reading(path, 0));
 }

@@ -28,7 +28,7 @@ class velm_simulation final : public velm_system_calls {
     int symlink(const char* target, const char* path) const override;
     int remove(const char* path) const override;
     int open_for_reading(const char* path, int flags) const override;
-    int write_file(const char* path, const std::string& text) const override;
+    void write_file(const char* path, const std::string& text) const override;
     void set_protection_class(const char* path, int protection_class) const override;
 
     // The entry at path, its last component not followed (or followed).

@@ -44,32 +44,24 @@ velm_system_calls::open_for_reading(const char* path, int flags) const
     return ::open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | flags);
 }
 
-int
+void
 velm_system_calls::write_file(const char* path, const std::string& text) const
 {
     // Not through a link, which could aim the write at any file of the
     // system, and not into a FIFO or a device: O_NONBLOCK makes a FIFO
     // without a reader fail at once, and fstat tells the rest. A file with
     // another name (a hard link) is not this tool's either, so it is
-    // truncated only once it is known to be the record alone.
+    // truncated only once it is known to be the record alone. An empty
+    // file, as a new one is, needs no truncating; and truncating one makes
+    // some file systems write it out at close, which is felt at boot.
     int fd = ::open(path, O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, 0666);
     if (fd < 0)
-        return -1;
-    // An empty file, as a new one is, needs no truncating; and truncating
-    // one makes some file systems write it out at close, which is felt at
-    // boot.
+        return;
     struct stat st;
-    int result = fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink == 1 &&
-                         (st.st_size == 0 || ftruncate(fd, 0) == 0)
-                     ? 0
-                     : -1;
-    for (size_t done = 0; result == 0 && done < text.size();) {
-        ssize_t n = ::write(fd, text.data() + done, text.size() - done);
-        result = n > 0 ? 0 : -1;
-        done += n > 0 ? static_cast<size_t>(n) : 0;
-    }
+    if (fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink == 1 &&
+        (st.st_size == 0 || ftruncate(fd, 0) == 0))
+        (void)::write(fd, text.data(), text.size());
     (void)::close(fd);
-    return result;
 }
 
 void

@@ -25,9 +25,10 @@ class velm_system_calls {
     virtual int remove(const char* path) const;
     // Opens for reading only, never blocking: flags may add O_DIRECTORY.
     virtual int open_for_reading(const char* path, int flags) const;
-    // Replaces the content of a regular file, created when missing; fails
-    // on anything else at path, a link included (the link is not followed).
-    virtual int write_file(const char* path, const std::string& text) const;
+    // Replaces the content of a regular file, created when missing, and
+    // leaves anything else at path alone, a link included (the link is not
+    // followed). Nobody is told whether it worked.
+    virtual void write_file(const char* path, const std::string& text) const;
     // open, fcntl F_SETPROTECTIONCLASS where the platform has it, close;
     // every failure ignored.
     virtual void set_protection_class(const char* path, int protection_class) const;
