@@ -218,12 +218,15 @@ find_unreadable(const velm_simulation& tree, velm_report& r)
     }
     // An update's ICU directory is read, not only looked up.
     for (const std::string& root : {r.live.root, r.latest.root}) {
-        int fd = root.empty() ? -1 : tree.open_for_reading((root + "/icutz").c_str(), O_DIRECTORY);
-        if (!root.empty() && fd < 0 && seen.insert(errno).second)
+        if (root.empty())
+            continue;
+        int fd = tree.open_for_reading((root + "/icutz").c_str(), O_DIRECTORY);
+        if (fd >= 0)
+            (void)close(fd);
+        else if (seen.insert(errno).second)
             add(r, "warning", "unreadable",
                 root + "/icutz cannot be read: " + strerror(errno) + ".",
                 "make it readable, or remove it");
-        (void)close(fd);
     }
 }
 
