@@ -5,6 +5,7 @@
 #include "driver/startup.h"
 #include "support/prefix.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -37,16 +38,13 @@ as_tzlinks(const std::function<void()>& f)
     dup2(saved, 2);
     close(saved);
     program_invocation_short_name = name;
-    std::vector<std::string> lines;
-    std::string line;
-    char c;
-    for (off_t at = 0; pread(caught, &c, 1, at) == 1; ++at) {
-        if (c != '\n')
-            line += c;
-        else
-            lines.push_back(std::move(line)), line.clear();
-    }
+    std::string text(static_cast<size_t>(lseek(caught, 0, SEEK_END)), '\0');
+    text.resize(
+        static_cast<size_t>(std::max(pread(caught, text.data(), text.size(), 0), ssize_t(0))));
     close(caught);
+    std::vector<std::string> lines;
+    for (size_t at = 0, end; (end = text.find('\n', at)) != std::string::npos; at = end + 1)
+        lines.push_back(text.substr(at, end - at));
     return lines;
 }
 
@@ -131,7 +129,6 @@ read_state(const velm_simulation& tree, velm_report& r)
         const velm_dataset& current = live ? *live : *system;
         r.live.compatible = live && live->compatible(*system);
         r.live.older = live && *system > *live;
-        r.live.newer = live && *live > *system;
         r.latest.compatible = latest && latest->compatible(*system);
         r.latest.newer = latest && *latest > current;
     });

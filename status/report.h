@@ -18,7 +18,7 @@ struct velm_dataset_facts {
     bool version_understood = false;
     std::string icu_schema;
     bool compatible = false; // with the system dataset
-    bool newer = false;      // latest: than the dataset in use; live: than the system's
+    bool newer = false;      // latest: than the dataset in use
     bool older = false;      // live: than the system's
 };
 
