@@ -89,7 +89,7 @@ void
 try_faults(const std::string& pristine)
 {
     restore = "rm -rf /var/* && cp -a " + pristine + "/. /var", expected.clear(), counts.clear();
-    run(restore), run("strace -f -qq -o " + pristine + ".trace " TZLINKS_BINARY);
+    run(restore), run("exec strace -f -qq -o " + pristine + ".trace " TZLINKS_BINARY);
     settle(&expected);
     reference = snapshot();
     std::ifstream trace(pristine + ".trace");
