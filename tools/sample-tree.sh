@@ -76,3 +76,15 @@ live_update() {
 latest() {
     put_link $tz/tz/$1 $tz/tz_latest
 }
+
+# The demo's device, as an image leaves it before its first boot: system
+# data 2023c live, an update 2024a.1.0 named by tz_latest, and the links of
+# an older system (localtime into /usr/share/zoneinfo, /var/db/icutz).
+demo_device() {
+    system_dataset 2023c 44l
+    update_dataset 2024a.1.0 44l
+    put_link /usr/share/zoneinfo.default $tz/zoneinfo
+    latest 2024a.1.0
+    put_link /usr/share/zoneinfo/Europe/Paris $tz/localtime
+    put_link /usr/share/icu /var/db/icutz
+}
