@@ -81,7 +81,7 @@ const std::string not_utf8 =
 
 // tzlinks-status's command line; and the bytes of a name that are not
 // UTF-8, or are control characters, as \udcHH and \u00HH in JSON and as
-// \xHH in text.
+// \xHH in text, a quote and a backslash escaped in JSON only.
 TEST(status, command_line)
 {
     const std::string usage = "usage: tzlinks-status [--json] [--root DIR]\n"
@@ -102,8 +102,8 @@ TEST(status, command_line)
     }
     ASSERT_TRUE(fresh_tree());
     ASSERT_TRUE(build_tree("system_dataset 2023c 44l; live_system"));
-    std::string target = "/x/\x01\x7f" + utf8, text = "/x/\\x01\\x7f" + utf8,
-                json = "/x/\\u0001\x7f" + utf8;
+    std::string target = "/x/\x01\x7f\"\\" + utf8, text = "/x/\\x01\\x7f\"\\" + utf8,
+                json = "/x/\\u0001\x7f\\\"\\\\" + utf8;
     for (char c : not_utf8) {
         std::string hex = {"0123456789abcdef"[(c >> 4) & 15], "0123456789abcdef"[c & 15]};
         target += c, text += c == '/' ? "/" : "\\x" + hex, json += c == '/' ? "/" : "\\udc" + hex;
