@@ -43,12 +43,9 @@ program(const std::string& path, const std::string& args)
 std::string
 tzlinks(const std::string& inject)
 {
-    return "exec " +
-           (inject.empty()
-                ? ""
-                : "strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=" + inject +
-                      " ") +
-           (runner ? runner : "") + " " TZLINKS_BINARY;
+    std::string strace = "strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=";
+    return "exec " + (inject.empty() ? "" : strace + inject) + " " + (runner ? runner : "") +
+           " " TZLINKS_BINARY;
 }
 
 static std::string
@@ -160,6 +157,10 @@ load_rows()
     std::map<std::string, std::string> named = {{"@", live_dir + "tz/"}};
     std::vector<std::string> lines;
     for (std::string line; std::getline(in, line);) {
+        for (const auto& [name, text] : named) { // defined before any row uses them
+            for (size_t at; (at = line.find(name)) != std::string::npos;)
+                line.replace(at, name.size(), text);
+        }
         if (line[0] == '$')
             named[line.substr(0, line.find(' '))] = line.substr(line.find(" = ") + 3);
         else if (line[0] == ' ')
@@ -168,13 +169,8 @@ load_rows()
             lines.push_back(line);
     }
     std::vector<row> rows;
-    for (std::string& line : lines) {
-        for (const auto& [name, text] : named) {
-            for (size_t at; (at = line.find(name)) != std::string::npos;)
-                line.replace(at, name.size(), text);
-        }
+    for (const std::string& line : lines)
         rows.push_back(parse(line));
-    }
     return rows;
 }
 

@@ -109,7 +109,10 @@ TEST(status, command_line)
         target += c, text += c == '/' ? "/" : "\\x" + hex, json += c == '/' ? "/" : "\\udc" + hex;
     }
     ASSERT_EQ(symlink(target.c_str(), "/var/db/timezone/tz_latest"), 0);
-    EXPECT_NE(run(program(TZLINKS_STATUS_BINARY)).out.find("  tz_latest -> " + text + "\n"),
+    EXPECT_NE(run(program(TZLINKS_STATUS_BINARY))
+                  .out.find("  tz_latest -> " + text + "\n  The zone is Europe/Paris.\n" +
+                            "  There is no record of an adoption.\nNext boot\n" +
+                            "  It keeps the data in use.\n"),
               std::string::npos);
     EXPECT_NE(
         run(program(TZLINKS_STATUS_BINARY, "--json")).out.find("\"tz_latest\":\"" + json + "\""),
