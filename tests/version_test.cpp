@@ -59,14 +59,11 @@ const char* const newer[][2] = {
 const char* const equal[][2] = {
     {"2023c.1.0", "2023c.1.0"}, {"", ""}, {"02023c.01.00", "2023c.1.0"}};
 
-velm_version
-version(const std::string& text)
-{
-    return text.empty() ? velm_version() : velm_version(text);
-}
-
 TEST(version, order)
 {
+    auto version = [](const std::string& t) {
+        return t.empty() ? velm_version() : velm_version(t);
+    };
     for (const auto& [a, b] : newer) {
         EXPECT_TRUE(version(a) > version(b)) << a << " " << b;
         EXPECT_FALSE(version(b) > version(a) || version(a) == version(b)) << a << " " << b;
