@@ -5,8 +5,8 @@
 // take away.
 //
 // Usage: replay [unlink PATH | symlink TARGET PATH | record PATH TEXT]...
-//   record opens, fstats, truncates, writes and closes, as the tool writes
-//   its version diff record.
+//   record opens, fstats, truncates (a file that is not empty), writes and
+//   closes, as the tool writes its version diff record.
 // Failures are ignored (an unlink of a missing entry costs what it costs);
 // the exit status is 0 unless the arguments are malformed.
 #include <cstring>
@@ -30,8 +30,8 @@ main(int argc, char** argv)
                           0666);
             if (fd >= 0) {
                 struct stat st;
-                (void)fstat(fd, &st);
-                (void)ftruncate(fd, 0);
+                if (fstat(fd, &st) == 0 && st.st_size > 0)
+                    (void)ftruncate(fd, 0);
                 (void)write(fd, argv[i + 2], std::strlen(argv[i + 2]));
                 (void)close(fd);
             }
