@@ -96,7 +96,8 @@ try_faults(const std::string& pristine)
     std::map<std::string, int> seen;
     bool started = false;
     std::smatch call;
-    const std::regex line("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += ");
+    const std::regex line("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += "),
+        changing("unlink|symlink|rmdir|ftruncate|write");
     for (std::string text; std::getline(trace, text);) {
         if (!std::regex_search(text, call, line))
             continue;
@@ -104,8 +105,8 @@ try_faults(const std::string& pristine)
         started = started || args.find("/var/db/timezone") != std::string::npos;
         if (!started || (name == "write" && args.compare(0, 2, "2,") == 0))
             continue; // the loader's calls, and the warnings' own writes
-        bool changes = args.find("O_CREAT") != std::string::npos ||
-                       std::regex_match(name, std::regex("unlink|symlink|rmdir|ftruncate|write"));
+        bool changes =
+            args.find("O_CREAT") != std::string::npos || std::regex_match(name, changing);
         for (auto [f, end] = failures.equal_range(name); f != end; ++f)
             attempt(name + ":error=" + f->second + ":when=" + when);
         if (changes && name != "write" && name != "ftruncate")
