@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Provides GoogleTest to the test suite. A native build links Debian's
 # prebuilt library; a cross build, a build against libc++ (the prebuilt one
 # is made for libstdc++) or a machine that lacks the library compiles it for

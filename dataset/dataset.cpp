@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "dataset/dataset.h"
 
 #include "dataset/icu.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A complete set of time-zone data the device could use: the system
 // partition's, or an update unpacked below /var/db/timezone/tz/.
 #ifndef TZLINKS_DATASET_DATASET_H

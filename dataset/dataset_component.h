@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One kind of time-zone data inside a dataset: the compiled tz database
 // (velm_zoneinfo) or the ICU time-zone data (velm_icu).
 #ifndef TZLINKS_DATASET_DATASET_COMPONENT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef TZLINKS_DATASET_FIRST_WORD_H
 #define TZLINKS_DATASET_FIRST_WORD_H
 

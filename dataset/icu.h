@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The ICU time-zone data of a dataset. Two ICU components are
 // interchangeable only when their schemas (format tags such as 44l) match.
 #ifndef TZLINKS_DATASET_ICU_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "dataset/zoneinfo.h"
 
 #include "dataset/first_word.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The compiled tz database of a dataset.
 #ifndef TZLINKS_DATASET_ZONEINFO_H
 #define TZLINKS_DATASET_ZONEINFO_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Housekeeping done before any dataset is looked at. None of these report
 // a failure to the caller.
 #ifndef TZLINKS_DRIVER_HOUSEKEEPING_H

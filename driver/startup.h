@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef TZLINKS_DRIVER_STARTUP_H
 #define TZLINKS_DRIVER_STARTUP_H
 

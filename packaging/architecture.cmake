@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Read by CPack before it makes the package: Debian's name for the
 # architecture the compiler targets (arm64 for aarch64-linux-gnu), so that
 # a cross build is not named for the build machine. Asked only here, so

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Run by CPack on the finished package of statically linked programs. They
 # contain code of the C library, whose licence (LGPL-2.1+) requires its
 # source to stay available: Built-Using names the glibc source they were

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The Debian package of this build: exactly what the install rules stage,
 # for the architecture the build targets. "cpack" in the build directory
 # makes it; tools/package also lists and checks it.

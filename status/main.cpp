@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tzlinks-status: says which time-zone data a device (or an image of one)
 // uses, what its next boot will do, and what is wrong; changes nothing.
 #include "status/report.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "status/report.h"
 
 // How many bytes from text[i] on form one valid UTF-8 character, or 0.

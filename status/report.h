@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What tzlinks-status says of a device tree: the links as they stand, the
 // datasets they name, what the next boot will leave, and what is wrong.
 #ifndef TZLINKS_STATUS_REPORT_H

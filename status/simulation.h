@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A device tree read through a directory, its root, and never changed:
 // calls that would change it are kept in memory, and later calls see them.
 // Paths and absolute link targets are resolved inside the root, one

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // File-system primitives. Each one either succeeds or warns on standard
 // error and throws the errno of the failed call as a plain int.
 //

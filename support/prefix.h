@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef TZLINKS_SUPPORT_PREFIX_H
 #define TZLINKS_SUPPORT_PREFIX_H
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parsed form of a dataset version string such as 2023c.1.0, and the
 // order that decides whether one dataset is newer than another.
 #ifndef TZLINKS_SUPPORT_VERSION_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The fault and power-cut mode: with TZLINKS_FAULTS set, every end-to-end
 // row also runs tzlinks again and again from its tree, with strace failing
 // each call it makes on the file system in turn (once; a change of the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The test harness: in the private user and mount namespace that CTest
 // starts the tests in, empty tmpfs mounts hide the host's /var and
 // /usr/share, so that the real programs run on the fixed paths without

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs the rows of tests/tool.rows: the real tzlinks binary on a sample
 // device tree in the sandbox, with its exact standard error, exit status
 // and every entry it changes. Before it, tzlinks-status reads the same

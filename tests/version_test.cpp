@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // In-process: the version parse's fields, range errors and order, which no
 // end-to-end row can reach; and the two hand-written matchers against
 // std::regex with their own patterns, on every text up to the length where

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Cross-builds for 64-bit Arm Linux with Debian's cross compiler
 # (g++-aarch64-linux-gnu), whose headers and libraries live below the
 # sysroot /usr/aarch64-linux-gnu.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Builders for sample device trees, sourced by the demo, the benchmark, the
 # fault runs and the end-to-end tests. Every path is taken below $TREE
 # (empty: the real fixed paths, as inside the sandbox).

@@ -1,4 +1,5 @@
 #!/bin/sh
+# SPDX-License-Identifier: Apache-2.0
 # The usual alternative to tzlinks, for comparison only: the same boot-time
 # decision written as a plain POSIX shell script with readlink, ln and
 # sort -V. It keeps the dataset the zoneinfo link names when it fits the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Times several commands run in turn, one run of each per round, so that
 // whatever else the machine is doing at a given moment weighs on all of them
 // alike. Ratios are taken run by run against the first command (the floor),

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Makes the changes a tzlinks run made to the tree, and nothing else: the
 // same unlink, symlink and record calls, in the same order, from a program
 // that is otherwise empty. Timed beside tzlinks, it shows what those calls

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Sorts the system calls of one traced tzlinks run (strace -f -o FILE) into
 # three kinds and names the reason for each call:
 #   startup  process start-up, before the tool's first own call (loader,

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The device trees the benchmark runs on, built below $TREE with the
 # builders of tools/sample-tree.sh (source that first). Each is a state a
 # device is really found in at boot.
