@@ -4,13 +4,14 @@
 #include "dataset/icu.h"
 #include "dataset/zoneinfo.h"
 #include "support/fs.h"
+#include "support/paths.h"
 #include "support/prefix.h"
 
 #include <err.h>
 #include <stdexcept>
 
-static const char update_prefix[] = "/var/db/timezone/tz/";
-static const size_t update_prefix_length = sizeof update_prefix - 1;
+static const char* const update_prefix = velm_path::updates;
+static const size_t update_prefix_length = sizeof velm_path::updates - 1;
 
 velm_dataset::velm_dataset()
 {
@@ -87,13 +88,13 @@ force_system_dataset()
 std::string
 latest_dataset_path()
 {
-    return velm_fs::read_symlink("/var/db/timezone/tz_latest");
+    return velm_fs::read_symlink(velm_path::latest_link);
 }
 
 std::string
 current_dataset_path()
 {
-    return dataset_path_from_zoneinfo_link(velm_fs::read_symlink("/var/db/timezone/zoneinfo"));
+    return dataset_path_from_zoneinfo_link(velm_fs::read_symlink(velm_path::zoneinfo_link));
 }
 
 // The link points at <root>/zoneinfo for an update, so the root is all
@@ -105,7 +106,7 @@ dataset_path_from_zoneinfo_link(const std::string& target)
         size_t last_slash = target.rfind('/');
         if (last_slash > update_prefix_length)
             return target.substr(0, last_slash);
-    } else if (target == "/usr/share/zoneinfo.default") {
+    } else if (target == velm_path::system_zoneinfo) {
         return std::string();
     }
     warn("Bad zoneinfo link %s", target.c_str());

@@ -3,6 +3,7 @@
 
 #include "support/fs.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -15,14 +16,15 @@ is_space(char c)
 }
 
 void
-read_first_word(const std::string& path, std::string& target)
+read_first_word(const std::string& path, std::string& target, size_t keep)
 {
-    int fd = system_calls().open_for_reading(path.c_str(), 0);
+    // Never blocking: a FIFO without a writer would stop the boot for ever.
+    int fd = system_calls().open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
     if (fd < 0)
         return;
     // Only a regular file is read: a FIFO or a device may never end its
-    // word. A directory is read too, which fails at once with EISDIR, as it
-    // always has; that is what errno says in the messages that follow.
+    // word. A directory is read too, which fails at once with EISDIR; that
+    // is what errno says in the messages that follow.
     struct stat st;
     std::string word;
     bool more = fstat(fd, &st) == 0 && (S_ISREG(st.st_mode) || S_ISDIR(st.st_mode));
@@ -33,6 +35,7 @@ read_first_word(const std::string& path, std::string& target)
                 word += buffer[i];
             else
                 more = word.empty();
+            more = more && word.size() <= keep;
         }
     }
     (void)close(fd);

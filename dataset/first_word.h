@@ -7,7 +7,9 @@
 // Replaces target with the first white-space separated word of the file at
 // path, read the way `stream >> string` reads it in the classic locale.
 // A file that cannot be opened or holds no word leaves target unchanged;
-// nothing is reported.
-void read_first_word(const std::string& path, std::string& target);
+// nothing is reported. Reading stops once the word is longer than keep
+// bytes, and so does the word: a word nobody uses need not be held whole.
+void read_first_word(const std::string& path, std::string& target,
+                     size_t keep = std::string::npos);
 
 #endif

@@ -3,6 +3,7 @@
 
 #include "dataset/first_word.h"
 #include "support/fs.h"
+#include "support/paths.h"
 #include "support/prefix.h"
 
 #include <cerrno>
@@ -12,14 +13,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-static const char system_icu_dir[] = "/usr/share/icu";
-static const char icu_link[] = "/var/db/timezone/icutz";
-static const char legacy_icu_link[] = "/var/db/icutz";
-
 velm_icu::velm_icu() : velm_icu(std::string()) {}
 
 velm_icu::velm_icu(const std::string& root)
-    : velm_dataset_component(root), data_dir(root.empty() ? system_icu_dir : root + "/icutz")
+    : velm_dataset_component(root), data_dir(root.empty() ? velm_path::system_icu : root + "/icutz")
 {
     initialize();
 }
@@ -74,15 +71,15 @@ first_schema_in(int directory)
 void
 velm_icu::find_update_schema()
 {
-    int directory = system_calls().open_for_reading(data_dir.c_str(), O_DIRECTORY);
+    int directory =
+        system_calls().open(data_dir.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC);
     if (directory >= 0) {
         schema = first_schema_in(directory);
         (void)close(directory);
     }
     if (schema.empty()) {
-        // A walk that finds nothing ends with errno at 0, as it always
-        // has: this warning, and those after it that follow no failed
-        // call, carry that text.
+        // A walk that finds nothing ends with errno at 0: this warning,
+        // and those after it that follow no failed call, carry that text.
         errno = 0;
         warn("No ICU schema found for %s", root_path.c_str());
     }
@@ -103,11 +100,11 @@ void
 velm_icu::activate() const
 {
     try {
-        velm_fs::remove(icu_link);
-        velm_fs::remove(legacy_icu_link);
+        velm_fs::remove(velm_path::icutz_link);
+        velm_fs::remove(velm_path::legacy_icu_link);
     } catch (...) {
         warn("unlink of ICU softlink failed");
     }
     if (!root_path.empty())
-        velm_fs::create_symlink(data_dir, icu_link);
+        velm_fs::create_symlink(data_dir, velm_path::icutz_link);
 }

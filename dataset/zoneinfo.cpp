@@ -4,16 +4,15 @@
 #include "dataset/first_word.h"
 #include "support/fs.h"
 
-#include <err.h>
+#include "support/paths.h"
 
-static const char system_zoneinfo_dir[] = "/usr/share/zoneinfo.default";
-static const char zoneinfo_link[] = "/var/db/timezone/zoneinfo";
+#include <err.h>
 
 velm_zoneinfo::velm_zoneinfo() : velm_zoneinfo(std::string()) {}
 
 velm_zoneinfo::velm_zoneinfo(const std::string& root)
     : velm_dataset_component(root),
-      data_dir(root.empty() ? system_zoneinfo_dir : root + "/zoneinfo")
+      data_dir(root.empty() ? velm_path::system_zoneinfo : root + "/zoneinfo")
 {
     read_version();
 }
@@ -21,7 +20,10 @@ velm_zoneinfo::velm_zoneinfo(const std::string& root)
 void
 velm_zoneinfo::read_version()
 {
-    read_first_word(data_dir + "/+VERSION", version_text);
+    // Only the system partition's version is ever used: an update's is not
+    // held, however long, only opened and read into as the boot always has.
+    read_first_word(data_dir + "/+VERSION", version_text,
+                    root_path.empty() ? std::string::npos : 0);
 }
 
 bool
@@ -36,9 +38,9 @@ velm_zoneinfo::activate() const
     // A stale entry that cannot be removed is worth a warning, not giving
     // up: the creation below fails on its own if the name is still taken.
     try {
-        velm_fs::remove(zoneinfo_link);
+        velm_fs::remove(velm_path::zoneinfo_link);
     } catch (...) {
         warn("Unlink of zoneinfo symlink failed");
     }
-    velm_fs::create_symlink(data_dir, zoneinfo_link);
+    velm_fs::create_symlink(data_dir, velm_path::zoneinfo_link);
 }

@@ -17,7 +17,8 @@ class velm_zoneinfo final : public velm_dataset_component {
     // Points /var/db/timezone/zoneinfo at data_dir.
     void activate() const override;
 
-    // First word of data_dir/+VERSION; empty when there is none.
+    // First word of data_dir/+VERSION; empty when there is none. Only the
+    // system partition's is kept whole.
     std::string get_version_text() const { return version_text; }
     const std::string& get_data_dir() const { return data_dir; }
 

@@ -2,15 +2,16 @@
 #include "driver/localtime.h"
 
 #include "support/fs.h"
+#include "support/paths.h"
 #include "support/prefix.h"
 
 #include <err.h>
 
-static const char localtime_link[] = "/var/db/timezone/localtime";
-static const char live_prefix[] = "/var/db/timezone/zoneinfo";
-static const char legacy_prefix[] = "/usr/share/zoneinfo";
-static const char default_zone[] = "America/Los_Angeles";
-static const char default_target[] = "/var/db/timezone/zoneinfo/America/Los_Angeles";
+using velm_path::localtime_link;
+// A link into the live tree is kept; one into the tree of older systems is
+// moved into the live one.
+static const char* const live_prefix = velm_path::zoneinfo_link;
+static const char* const legacy_prefix = velm_path::legacy_zoneinfo;
 
 // True when the link is fine as it is or has been rewritten; false when it
 // has to be reset. Any failure on the way also means a reset.
@@ -23,7 +24,7 @@ keep_or_rewrite_localtime()
             return true;
         if (!has_prefix(target, legacy_prefix))
             return false;
-        std::string corrected = live_prefix + target.substr(sizeof legacy_prefix - 1);
+        std::string corrected = std::string(live_prefix) + target.substr(sizeof velm_path::legacy_zoneinfo - 1);
         warn("Correcting localtime link to %s", corrected.c_str());
         if (!velm_fs::path_exists(corrected))
             return false;
@@ -40,7 +41,7 @@ correct_localtime_symlink()
 {
     if (keep_or_rewrite_localtime())
         return;
-    warn("localtime link invalid; resetting to %s", default_zone);
+    warn("localtime link invalid; resetting to %s", velm_path::default_zone);
     (void)system_calls().remove(localtime_link);
-    velm_fs::create_symlink(default_target, localtime_link);
+    velm_fs::create_symlink(velm_path::default_localtime, localtime_link);
 }

@@ -6,11 +6,10 @@
 #include "driver/localtime.h"
 
 #include "support/fs.h"
+#include "support/paths.h"
 
 #include <cerrno>
 #include <err.h>
-
-static const char version_diff_record[] = "/var/db/timezone/TZVersionDiffRecord";
 
 // Names the last adoption: "<in use before>_<adopted>", no line end. A
 // record that cannot be written is not worth a message: the adoption itself
@@ -18,7 +17,7 @@ static const char version_diff_record[] = "/var/db/timezone/TZVersionDiffRecord"
 static void
 write_version_diff_record(const std::string& before, const std::string& adopted)
 {
-    system_calls().write_file(version_diff_record, before + "_" + adopted);
+    velm_fs::write_own_file(velm_path::record, before + "_" + adopted);
 }
 
 // Reads the zoneinfo link; a link that is missing or not understood puts
@@ -29,7 +28,7 @@ read_current_path()
     try {
         return current_dataset_path();
     } catch (...) {
-        warn("Invalid current symlinks; resetting to system partition");
+        warn("%s", velm_says::invalid_current);
         force_system_dataset();
         return std::string();
     }
@@ -47,7 +46,7 @@ decide()
     velm_dataset current(current_path);
     const velm_dataset* in_use = &current;
     if (!current.compatible(system) || system > current) {
-        warn("Symlink points at data incompatible with installed system");
+        warn("%s", velm_says::incompatible);
         force_system_dataset();
         in_use = &system;
     }
@@ -61,7 +60,7 @@ decide()
         latest.activate();
         write_version_diff_record(in_use->get_version_string(), latest.get_version_string());
     } else {
-        warn("New update not compatible or older version: %s vs. %s",
+        warn("%s: %s vs. %s", velm_says::refused,
              latest.get_version_string().c_str(), current.get_version_string().c_str());
     }
 }
@@ -71,16 +70,16 @@ run_startup_sequence()
 {
     protect_data_directories();
     migrate_icu_link();
-    (void)system_calls().remove("/var/db/icu");
+    (void)system_calls().remove(velm_path::legacy_icu);
 
     try {
         decide();
     } catch (...) {
-        warn("Unable to locate data; resetting to system partition");
+        warn("%s", velm_says::unable);
         try {
             force_system_dataset();
         } catch (...) {
-            warn("Last resort force_system_dataset() failed");
+            warn("%s", velm_says::last_resort);
             // Without working links there is nothing sensible left to do,
             // not even the localtime repair; errno is the only account of
             // why.

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "status/report.h"
 
+#include <algorithm>
+
 // How many bytes from text[i] on form one valid UTF-8 character, or 0.
 static size_t
 utf8_length(const std::string& text, size_t i)
@@ -33,18 +35,43 @@ hex(const char* form, unsigned char byte)
     return text;
 }
 
-// Valid UTF-8 as it is; a control character, or a byte that is not part of
-// valid UTF-8, as \xHH.
+// A text no longer than longest_text bytes, or its start with the cut
+// marked; never cut inside a UTF-8 character.
 static std::string
-printable(const std::string& text)
+cut(const std::string& text)
 {
-    std::string out;
+    if (text.size() <= longest_text)
+        return text;
+    size_t end = longest_text;
+    while (end > longest_text - 3 && (static_cast<unsigned char>(text[end]) & 0xc0) == 0x80)
+        --end;
+    return text.substr(0, end) + "[cut: " + std::to_string(text.size() - end) + " more bytes]";
+}
+
+// Whether the character at text[i], n bytes long, is a control character:
+// C0 (and DEL) or C1 (U+0080 to U+009F, which terminals obey too).
+static bool
+control(const std::string& text, size_t i, size_t n)
+{
+    auto c = static_cast<unsigned char>(text[i]);
+    return c < 0x20 || c == 0x7f || (n == 2 && c == 0xc2 && static_cast<unsigned char>(text[i + 1]) < 0xa0);
+}
+
+// Valid UTF-8 as it is; a control character, or a byte that is not part of
+// valid UTF-8, as \xHH, each of its bytes.
+static std::string
+printable(const std::string& whole)
+{
+    std::string text = cut(whole), out;
     for (size_t i = 0; i < text.size();) {
         size_t n = utf8_length(text, i);
-        if (n == 0 || static_cast<unsigned char>(text[i]) < 0x20 || text[i] == 0x7f)
-            out += hex("\\x%02x", static_cast<unsigned char>(text[i])), n = 1;
-        else
+        if (n == 0 || control(text, i, n)) {
+            for (size_t k = 0; k < std::max(n, size_t(1)); ++k)
+                out += hex("\\x%02x", static_cast<unsigned char>(text[i + k]));
+            n = std::max(n, size_t(1));
+        } else {
             out.append(text, i, n);
+        }
         i += n;
     }
     return out;
@@ -53,9 +80,9 @@ printable(const std::string& text)
 // A JSON string. A byte that is not part of valid UTF-8 becomes \udcHH,
 // the surrogate escape: decoders that know it give the byte back.
 static std::string
-json(const std::string& text)
+json(const std::string& whole)
 {
-    std::string out = "\"";
+    std::string text = cut(whole), out = "\"";
     for (size_t i = 0; i < text.size();) {
         size_t n = utf8_length(text, i);
         auto c = static_cast<unsigned char>(text[i]);
@@ -106,10 +133,19 @@ json_report(const velm_report& r)
     std::string messages, findings;
     for (const std::string& message : next.messages)
         messages += (messages.empty() ? "" : ",") + json(message);
-    for (const velm_finding& f : r.findings)
+    for (const velm_finding& f : r.findings) {
+        std::string commands;
+        for (const velm_command& command : f.commands.value_or(velm_commands()))
+            commands += (commands.empty() ? "" : ",") + json(shell_text(command, r.root));
         findings += std::string(findings.empty() ? "" : ",") + "{\"id\":" + json(f.id) +
                     ",\"severity\":" + json(f.severity) + ",\"message\":" + json(f.message) +
-                    ",\"repair\":" + json(f.repair) + "}";
+                    ",\"commands\":" + (f.commands ? "[" + commands + "]" : "null") +
+                    ",\"manual\":" + json(f.manual.empty() ? velm_text() : f.manual) +
+                    ",\"verified\":" + json(f.verified) + "}";
+    }
+    std::string remaining;
+    for (const std::string& id : r.repaired_findings)
+        remaining += (remaining.empty() ? "" : ",") + json(id);
     return "{\"zoneinfo\":" + json(r.zoneinfo) + ",\"icutz\":" + json(r.icutz) +
            ",\"localtime\":" + json(r.localtime) + ",\"tz_latest\":" + json(r.tz_latest) +
            ",\"record\":" + json(r.record) + ",\"localtime_zone\":" +
@@ -120,7 +156,9 @@ json_report(const velm_report& r)
            ",\"icutz\":" + json(next.icutz) + ",\"localtime\":" + json(next.localtime) +
            ",\"record\":" + json(next.record) +
            ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
-           "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) + "}\n";
+           "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) +
+           ",\"after_repair\":{\"health\":" + json(r.repaired_health) + ",\"findings\":[" +
+           remaining + "]}}\n";
 }
 
 static std::string
@@ -144,6 +182,20 @@ what_it_does(const std::string& action)
            : action == "reset" ? "It resets the device to the system data."
            : action == "keep"  ? "It keeps the data in use."
                                : "It fails: not even the system data can be linked.";
+}
+
+// How a finding is repaired, in one line or a line for each command.
+static std::string
+repair(const velm_finding& f, const std::string& root)
+{
+    if (!f.commands)
+        return f.manual.empty() ? "Repair: none needed." : "Needs: " + printable(f.manual) + ".";
+    if (f.commands->empty())
+        return "Repair: nothing to run; the next boot does it.";
+    std::string out = f.verified ? "Repair:" : "Repair (not shown to work):";
+    for (const velm_command& command : *f.commands)
+        out += "\n      " + printable(shell_text(command, root));
+    return out;
 }
 
 std::string
@@ -176,8 +228,25 @@ text_report(const velm_report& r)
     if (next.exit_status != 0)
         out += "  It exits with status " + std::to_string(next.exit_status) + ".\n";
     out += r.findings.empty() ? "Findings: none.\n" : "Findings\n";
-    for (const velm_finding& f : r.findings)
-        out += "  " + f.severity + " " + f.id + ": " + printable(f.message) +
-               "\n    Repair: " + f.repair + ".\n";
-    return out + "Health: " + r.health + ".\n";
+    bool any = false;
+    for (const velm_finding& f : r.findings) {
+        out += "  " + f.severity + " " + f.id + ": " + printable(f.message) + "\n";
+        out += "    " + repair(f, r.root) + "\n";
+        any = any || (f.commands && !f.commands->empty());
+    }
+    out += "Health: " + r.health + ".\n";
+    if (any)
+        out += "After these repairs and one boot: " + r.repaired_health + ".\n";
+    return out;
+}
+
+std::string
+commands_report(const velm_report& r)
+{
+    std::string out;
+    for (const velm_finding& f : r.findings) {
+        for (const velm_command& command : f.commands.value_or(velm_commands()))
+            out += shell_text(command, r.root) + "\n";
+    }
+    return out;
 }

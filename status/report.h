@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // What tzlinks-status says of a device tree: the links as they stand, the
-// datasets they name, what the next boot will leave, and what is wrong.
+// datasets they name, what the next boot will leave, what is wrong, and the
+// commands that repair it.
 #ifndef TZLINKS_STATUS_REPORT_H
 #define TZLINKS_STATUS_REPORT_H
 
@@ -20,31 +21,62 @@ struct velm_dataset_facts {
     std::string icu_schema;
     bool compatible = false; // with the system dataset
     bool newer = false;      // latest: than the dataset in use
-    bool older = false;      // live: than the system's
+    bool older = false;      // than the system's
 };
 
+// One run of the boot tool on the simulation, and what it leaves.
+struct velm_run {
+    std::string action; // keep, adopt (the update tz_latest names), reset or fail
+    velm_text zoneinfo, icutz, localtime, record;
+    std::vector<std::string> messages; // what the run writes on standard error
+    int exit_status = 0;
+};
+
+using velm_commands = std::vector<velm_command>;
+
 struct velm_finding {
-    std::string id, severity, message, repair; // severity: error, warning or note
+    std::string id, severity, message; // severity: error, warning or note
+    // What a person runs to repair it, in order, followed by one boot; none
+    // when only a person can supply what manual names.
+    std::optional<velm_commands> commands;
+    std::string manual;
+    std::string subject; // the path it is about: with the id, what tells two apart
+    bool verified = false; // the commands, simulated, clear it and break nothing
+    // Repairs to try, in order: the first that the simulation shows to work
+    // becomes commands; when none does, manual (or the first, unverified).
+    std::vector<velm_commands> tries;
 };
 
 struct velm_report {
+    std::string root; // the directory read, as the commands name it: "" for /
     velm_text zoneinfo, icutz, localtime, tz_latest, record;
     bool zoneinfo_understood = false; // names an update's or the system's tz database
     std::string localtime_zone;       // what follows the live tree's prefix, if anything
     velm_dataset_facts live, system, latest;
-    struct {
-        std::string action; // keep, adopt (the update tz_latest names), reset or fail
-        velm_text zoneinfo, icutz, localtime, record;
-        std::vector<std::string> messages; // what the run writes on standard error
-        int exit_status = 0;
-    } next_boot;
+    velm_run next_boot;
+    velm_text after_next; // zoneinfo as the boot after the next one leaves it
     std::vector<velm_finding> findings;
     std::string health; // healthy, degraded or broken
+    // The device after every finding's commands and one boot, as simulated.
+    std::string repaired_health;
+    std::vector<std::string> repaired_findings;
+    // The simulation as it stands, and as the next boot leaves it.
+    velm_simulation::changes now, next;
 };
 
-velm_report make_report(velm_simulation& tree);
+// The report of the tree as the simulation shows it now; the simulation is
+// left as it was found. root is how commands name the tree.
+velm_report make_report(velm_simulation& tree, const std::string& root);
 
+// The parts of a report, for a report of a tree changed in the simulation.
+velm_run simulate_boot(velm_simulation& tree);
+void find_problems(velm_simulation& tree, velm_report& r);
+
+// Texts longer than this are shown cut, the cut marked.
+const size_t longest_text = 8192;
 std::string text_report(const velm_report& report);
 std::string json_report(const velm_report& report);
+// Every finding's commands, in the report's order: a script for sh -e.
+std::string commands_report(const velm_report& report);
 
 #endif

@@ -6,52 +6,93 @@
 #include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
+#include <linux/fs.h>
+#include <sys/ioctl.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <unistd.h>
-#include <vector>
 
-// A canonical path ("" for the root, else "/a/b") as openat wants it.
+// A file longer than this is read only that far: no first word the boot
+// reads, and no path, comes near it, and the report stays small whatever
+// the tree holds.
+static const size_t longest_read = 64 * 1024;
+
+// A path below a directory descriptor ("" for the directory, else "/a/b")
+// as openat wants it.
 static std::string
-relative(const std::string& canonical)
+relative(const std::string& path)
 {
-    return canonical.empty() ? "." : canonical.substr(1);
+    return path.empty() ? "." : path.substr(1);
+}
+
+static std::string
+parent_of(const std::string& canonical)
+{
+    return canonical.substr(0, std::min(canonical.rfind('/'), canonical.size()));
+}
+
+velm_simulation::velm_simulation(int root_fd) : root(root_fd), as_root(geteuid() == 0) {}
+
+velm_simulation::~velm_simulation()
+{
+    reset();
 }
 
 velm_entry
-velm_simulation::real_entry(const std::string& canonical) const
+velm_simulation::real_entry(int base, const std::string& real)
 {
     velm_entry entry;
+    entry.base = base, entry.real = real;
     struct stat st;
-    if (fstatat(root, relative(canonical).c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0) {
+    if (fstatat(base, relative(real).c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0) {
         entry.error = errno == ENOENT ? 0 : errno;
         return entry;
     }
     if (S_ISLNK(st.st_mode)) {
-        std::vector<char> target(static_cast<size_t>(st.st_size) + 4096);
-        ssize_t n = readlinkat(root, relative(canonical).c_str(), target.data(), target.size());
-        entry.text.assign(target.data(), n > 0 ? static_cast<size_t>(n) : 0);
+        std::string target(static_cast<size_t>(st.st_size) + 4096, '\0');
+        ssize_t n = readlinkat(base, relative(real).c_str(), target.data(), target.size());
+        entry.text = target.substr(0, static_cast<size_t>(std::max(n, ssize_t(0))));
     }
     entry.shared = S_ISREG(st.st_mode) && st.st_nlink > 1;
-    entry.kind = S_ISLNK(st.st_mode)   ? velm_entry::link
-                 : S_ISREG(st.st_mode) ? velm_entry::file
-                 : S_ISDIR(st.st_mode) ? velm_entry::directory
-                                       : velm_entry::other;
+    entry.mode = st.st_mode & 07777;
+    entry.kind = S_ISLNK(st.st_mode)    ? velm_entry::link
+                 : S_ISREG(st.st_mode)  ? velm_entry::file
+                 : S_ISDIR(st.st_mode)  ? velm_entry::directory
+                 : S_ISFIFO(st.st_mode) ? velm_entry::fifo
+                 : S_ISSOCK(st.st_mode) ? velm_entry::socket
+                                        : velm_entry::device;
     return entry;
 }
 
+// The nearest change at or above a path decides what stands there: below a
+// new directory nothing does yet, below a copy the original's entries do.
 velm_entry
-velm_simulation::entry_at(const std::string& canonical) const
+velm_simulation::entry_at(const std::string& canonical)
 {
-    auto change = changed.find(canonical);
-    return change != changed.end() ? change->second : real_entry(canonical);
+    for (std::string above = canonical;; above = parent_of(above)) {
+        auto change = changed.find(above);
+        if (change != changed.end()) {
+            const velm_entry& entry = change->second;
+            if (above == canonical)
+                return entry;
+            if (entry.kind != velm_entry::directory || entry.fresh)
+                return velm_entry();
+            return real_entry(entry.base, entry.real + canonical.substr(above.size()));
+        }
+        if (above.empty())
+            return real_entry(root, canonical);
+    }
 }
 
 // Walks path a component at a time, following links (the last one only
 // when asked), an absolute target starting again from the root and ".."
-// never leaving it. Fails as the kernel would: ENOENT, ENOTDIR, ELOOP.
+// never leaving it. Fails as the kernel would: ENOENT, ENOTDIR, ELOOP, or
+// what looking up an entry met.
 velm_entry
-velm_simulation::resolve(const std::string& path, bool follow, std::string& canonical) const
+velm_simulation::resolve(const std::string& path, bool follow, std::string& canonical)
 {
+    settle();
     std::vector<std::string> todo; // components still to walk, the next one last
     auto push = [&todo](const std::string& text) {
         for (size_t end = text.size(); end > 0;) {
@@ -63,10 +104,9 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
         }
     };
     velm_entry failed;
-    if (path.empty()) {
-        failed.error = ENOENT;
+    failed.error = ENOENT;
+    if (path.empty())
         return failed;
-    }
     push(path);
     bool must_be_directory = path.back() == '/';
     velm_entry entry;
@@ -75,17 +115,20 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
         std::string name = todo.back();
         todo.pop_back();
         if (name == "..")
-            canonical.erase(std::min(canonical.rfind('/'), canonical.size()));
+            canonical = parent_of(canonical);
         if (name == "." || name == "..")
             continue;
-        std::string next = canonical;
-        next.append("/").append(name);
+        std::string next = canonical + "/" + name;
         entry = entry_at(next);
         bool last = todo.empty();
-        if (entry.error != 0)
+        if (entry.error != 0) {
+            trouble.emplace(next, entry.error);
             return entry;
+        }
         if (entry.kind == velm_entry::link && (!last || follow || must_be_directory)) {
             failed.error = ++links > 40 ? ELOOP : entry.text.empty() ? ENOENT : 0;
+            if (failed.error == ELOOP)
+                trouble.emplace(path, ELOOP);
             if (failed.error != 0)
                 return failed;
             if (entry.text[0] == '/')
@@ -99,13 +142,12 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
         }
         canonical = next;
     }
-    if (must_be_directory && entry.kind != velm_entry::directory)
-        failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
-    return failed.error != 0 ? failed : entry;
+    failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
+    return must_be_directory && entry.kind != velm_entry::directory ? failed : entry;
 }
 
 velm_entry
-velm_simulation::look(const std::string& path, bool follow) const
+velm_simulation::look(const std::string& path, bool follow)
 {
     int saved = errno;
     std::string canonical;
@@ -114,8 +156,84 @@ velm_simulation::look(const std::string& path, bool follow) const
     return entry;
 }
 
+std::optional<std::string>
+velm_simulation::read(const std::string& path, size_t limit)
+{
+    int saved = errno;
+    std::string canonical;
+    velm_entry entry = resolve(path, true, canonical);
+    std::optional<std::string> text;
+    int fd = entry.kind == velm_entry::file ? open_for_reading(canonical, entry, 0) : -1;
+    if (fd >= 0) {
+        text.emplace(limit, '\0');
+        ssize_t n = pread(fd, text->data(), limit, 0);
+        text->resize(static_cast<size_t>(std::max(n, ssize_t(0))));
+        (void)close(fd);
+    }
+    errno = saved;
+    return text;
+}
+
+std::vector<std::string>
+velm_simulation::names(const std::string& path)
+{
+    int saved = errno;
+    std::string canonical;
+    velm_entry entry = resolve(path, true, canonical);
+    std::set<std::string> found;
+    int fd = entry.kind == velm_entry::directory && !entry.fresh
+                 ? openat(entry.base, relative(entry.real).c_str(),
+                          O_RDONLY | O_DIRECTORY | O_CLOEXEC)
+                 : -1;
+    if (DIR* directory = fd < 0 ? nullptr : fdopendir(fd)) {
+        // cppcheck-suppress readdirCalled ; one thread, one directory stream
+        while (const struct dirent* child = readdir(directory))
+            found.insert(child->d_name);
+        closedir(directory);
+    }
+    found.erase("."), found.erase("..");
+    // What the simulation changed right below it.
+    for (auto c = changed.lower_bound(canonical + "/"); c != changed.end(); ++c) {
+        if (c->first.compare(0, canonical.size() + 1, canonical + "/") != 0)
+            break;
+        std::string name = c->first.substr(canonical.size() + 1);
+        if (name.find('/') != std::string::npos)
+            continue;
+        if (c->second.kind == velm_entry::absent)
+            found.erase(name);
+        else
+            found.insert(name);
+    }
+    errno = saved;
+    return std::vector<std::string>(found.begin(), found.end());
+}
+
+velm_simulation::changes
+velm_simulation::checkpoint()
+{
+    settle();
+    return {changed, writes};
+}
+
+void
+velm_simulation::rewind(const changes& to)
+{
+    settle();
+    changed = to.entries, writes = to.writes;
+}
+
+std::string
+velm_simulation::where(const std::string& path)
+{
+    int saved = errno;
+    std::string canonical;
+    resolve(path, false, canonical);
+    errno = saved;
+    return canonical;
+}
+
 bool
-velm_simulation::written(const std::string& path) const
+velm_simulation::written(const std::string& path)
 {
     std::string canonical;
     resolve(path, false, canonical);
@@ -123,23 +241,119 @@ velm_simulation::written(const std::string& path) const
 }
 
 int
-velm_simulation::fail(int error) const
+velm_simulation::fail(int error)
 {
     errno = error;
     return -1;
 }
 
+// Writes to files open for writing reach the tree's model once they are
+// done: the boot opens, writes and closes the record in one go.
+void
+velm_simulation::settle()
+{
+    for (const auto& [fd, canonical] : pending) {
+        velm_entry file;
+        file.kind = velm_entry::file, file.fresh = true;
+        file.text.resize(static_cast<size_t>(std::max(lseek(fd, 0, SEEK_END), off_t(0))));
+        file.text.resize(
+            static_cast<size_t>(std::max(pread(fd, file.text.data(), file.text.size(), 0),
+                                         ssize_t(0))));
+        changed[canonical] = file;
+        writes.insert(canonical);
+        (void)close(fd);
+    }
+    pending.clear();
+}
+
+void
+velm_simulation::reset()
+{
+    settle();
+    changed.clear(), writes.clear(), trouble.clear();
+}
+
+// Whether the boot may add or remove entries in a directory: 0, or the
+// error the kernel gives it (EROFS, EPERM for an immutable directory,
+// EACCES). A new directory lies on the file system of the real one above.
+int
+velm_simulation::may_change_in(const std::string& directory)
+{
+    std::string at = directory;
+    velm_entry entry = entry_at(at);
+    while (entry.fresh || entry.kind != velm_entry::directory) {
+        if (at.empty())
+            return 0;
+        at = parent_of(at);
+        entry = entry_at(at);
+    }
+    std::string path = relative(entry.real);
+    int fd = openat(entry.base, path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
+    struct statvfs fs = {};
+    bool read_only = fd >= 0 && fstatvfs(fd, &fs) == 0 && (fs.f_flag & ST_RDONLY) != 0;
+    if (fd >= 0)
+        (void)close(fd);
+    if (read_only)
+        return EROFS;
+    if (!as_root || at != directory)
+        return 0;
+    return faccessat(entry.base, path.c_str(), W_OK | X_OK, AT_EACCESS) == 0 ? 0 : errno;
+}
+
+// Whether the boot may open an existing entry for writing.
+int
+velm_simulation::may_write(const velm_entry& entry, int mode)
+{
+    if (entry.fresh)
+        return 0;
+    std::string path = relative(entry.real);
+    if (!as_root) {
+        int fd = openat(entry.base, path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+        struct statvfs fs = {};
+        bool read_only = fd >= 0 && fstatvfs(fd, &fs) == 0 && (fs.f_flag & ST_RDONLY) != 0;
+        if (fd >= 0)
+            (void)close(fd);
+        return read_only && entry.kind == velm_entry::file ? EROFS : 0;
+    }
+    return faccessat(entry.base, path.c_str(), mode, AT_EACCESS | AT_SYMLINK_NOFOLLOW) == 0 ? 0
+                                                                                          : errno;
+}
+
+// An immutable or append-only file or directory cannot be removed.
+bool
+velm_simulation::unremovable(const velm_entry& entry)
+{
+    if (entry.fresh || (entry.kind != velm_entry::file && entry.kind != velm_entry::directory))
+        return false;
+    int fd = openat(entry.base, relative(entry.real).c_str(),
+                    O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+    int flags = 0;
+    bool got = fd >= 0 && ioctl(fd, FS_IOC_GETFLAGS, &flags) == 0;
+    if (fd >= 0)
+        (void)close(fd);
+    return got && (flags & (FS_IMMUTABLE_FL | FS_APPEND_FL)) != 0;
+}
+
 // Each call below leaves errno as the real call would: untouched on
-// success, whatever the lookups inside it did.
+// success, whatever the lookups inside it did; on failure, the first error
+// in the kernel's own order of checks.
 
 int
-velm_simulation::unlink(const char* path) const
+velm_simulation::unlink(const char* path)
 {
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0 || entry.kind == velm_entry::absent)
-        return fail(entry.error != 0 ? entry.error : ENOENT);
+    if (entry.error != 0)
+        return fail(entry.error);
+    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+        return fail(error);
+    if (entry.kind == velm_entry::absent)
+        return fail(ENOENT);
+    if (int error = may_change_in(parent_of(canonical)); error != 0)
+        return fail(error);
+    if (unremovable(entry))
+        return fail(EPERM);
     if (entry.kind == velm_entry::directory)
         return fail(EISDIR);
     changed[canonical] = velm_entry();
@@ -148,7 +362,7 @@ velm_simulation::unlink(const char* path) const
 }
 
 int
-velm_simulation::access(const char* path) const
+velm_simulation::access(const char* path)
 {
     int saved = errno;
     std::string canonical;
@@ -160,7 +374,7 @@ velm_simulation::access(const char* path) const
 }
 
 ssize_t
-velm_simulation::readlink(const char* path, char* buffer, size_t size) const
+velm_simulation::readlink(const char* path, char* buffer, size_t size)
 {
     int saved = errno;
     std::string canonical;
@@ -177,101 +391,262 @@ velm_simulation::readlink(const char* path, char* buffer, size_t size) const
 int
 velm_simulation::symlink(
     const char* target, // NOLINT(bugprone-easily-swappable-parameters): symlink(2)'s order
-    const char* path) const
+    const char* path)
 {
     int saved = errno;
+    if (*target == '\0')
+        return fail(ENOENT);
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
     if (entry.error != 0)
         return fail(entry.error);
     if (entry.kind != velm_entry::absent)
         return fail(EEXIST);
-    if (*target == '\0')
-        return fail(ENOENT);
-    changed[canonical] = velm_entry{velm_entry::link, target, 0, false};
+    if (int error = may_change_in(parent_of(canonical)); error != 0)
+        return fail(error);
+    velm_entry link;
+    link.kind = velm_entry::link, link.text = target, link.fresh = true;
+    changed[canonical] = link;
     errno = saved;
     return 0;
 }
 
-// The simulated run removes nothing below a directory before it removes
-// the directory itself, so what the directory really holds decides.
+// What the simulated run removes below a directory before it removes the
+// directory itself is already in the listing.
 bool
-velm_simulation::empty_directory(const std::string& canonical) const
+velm_simulation::empty_directory(const std::string& canonical)
 {
-    int fd =
-        openat(root, relative(canonical).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    DIR* directory = fd < 0 ? nullptr : fdopendir(fd);
-    bool empty = directory != nullptr;
-    // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* child = empty ? readdir(directory) : nullptr)
-        empty = strcmp(child->d_name, ".") == 0 || strcmp(child->d_name, "..") == 0;
-    if (directory != nullptr)
-        closedir(directory);
-    return empty;
+    return names(canonical).empty();
 }
 
 int
-velm_simulation::remove(const char* path) const
+velm_simulation::rmdir(const char* path)
 {
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0 || entry.kind == velm_entry::absent)
-        return fail(entry.error != 0 ? entry.error : ENOENT);
-    if (entry.kind == velm_entry::directory && !empty_directory(canonical))
+    if (entry.error != 0)
+        return fail(entry.error);
+    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+        return fail(error);
+    if (entry.kind == velm_entry::absent)
+        return fail(ENOENT);
+    if (int error = may_change_in(parent_of(canonical)); error != 0)
+        return fail(error);
+    if (unremovable(entry))
+        return fail(EPERM);
+    if (entry.kind != velm_entry::directory)
+        return fail(ENOTDIR);
+    if (!empty_directory(canonical))
         return fail(ENOTEMPTY);
     changed[canonical] = velm_entry();
-    // The C library's remove tries unlink first, which fails on a
-    // directory and leaves EISDIR behind even when rmdir then succeeds.
-    errno = entry.kind == velm_entry::directory ? EISDIR : saved;
+    errno = saved;
     return 0;
 }
 
+// As the C library does it: unlink, and rmdir when that meets a directory.
 int
-velm_simulation::open_for_reading(const char* path, int flags) const
+velm_simulation::remove(const char* path)
+{
+    int removed = unlink(path);
+    return removed == 0 || errno != EISDIR ? removed : rmdir(path);
+}
+
+// An anonymous file holding text, open for reading and writing.
+static int
+anonymous_file(const std::string& text)
+{
+    int fd = memfd_create("simulated", MFD_CLOEXEC);
+    if (fd >= 0 && pwrite(fd, text.data(), text.size(), 0) != static_cast<ssize_t>(text.size())) {
+        (void)close(fd);
+        return -1;
+    }
+    return fd;
+}
+
+// A descriptor that only describes an entry (fstat works, nothing else):
+// what the boot gets for a FIFO, a device or a file it will not touch,
+// without opening any of them.
+static int
+description_of(const velm_entry& entry)
+{
+    return openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+}
+
+int
+velm_simulation::open_for_writing(const std::string& canonical, const velm_entry& entry)
+{
+    if (entry.kind == velm_entry::absent) {
+        if (int error = may_change_in(parent_of(canonical)); error != 0)
+            return fail(error);
+    } else if (entry.kind == velm_entry::link) {
+        return fail(ELOOP);
+    } else if (entry.kind == velm_entry::directory) {
+        return fail(EISDIR);
+    } else if (int error = may_write(entry, W_OK); error != 0) {
+        return fail(error);
+    } else if (entry.kind == velm_entry::fifo || entry.kind == velm_entry::socket) {
+        return fail(ENXIO); // a FIFO has no reader at boot
+    }
+    if (entry.kind == velm_entry::device || entry.shared)
+        return description_of(entry);
+    std::optional<std::string> text = entry.fresh ? entry.text : read(canonical, longest_read);
+    int fd = anonymous_file(text.value_or(""));
+    int kept = fd < 0 ? -1 : dup(fd);
+    if (kept < 0) {
+        if (fd >= 0)
+            (void)close(fd);
+        return fail(ENOMEM);
+    }
+    pending.emplace_back(kept, canonical);
+    return fd;
+}
+
+int
+velm_simulation::open_for_reading(const std::string& canonical, const velm_entry& entry, int flags)
+{
+    if ((flags & O_DIRECTORY) != 0 && entry.kind != velm_entry::directory)
+        return fail(ENOTDIR);
+    if (entry.kind == velm_entry::socket)
+        return fail(ENXIO);
+    if (entry.kind == velm_entry::fifo || entry.kind == velm_entry::device)
+        return description_of(entry);
+    if (entry.fresh) // a new directory lists nothing the boot looks for
+        return entry.kind == velm_entry::file ? anonymous_file(entry.text)
+                                               : openat(root, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    int fd = openat(entry.base, relative(entry.real).c_str(),
+                    O_RDONLY | O_NONBLOCK | O_CLOEXEC | (flags & O_DIRECTORY));
+    if (fd < 0) {
+        trouble.emplace(canonical, errno);
+        return -1;
+    }
+    struct stat st;
+    if (fstat(fd, &st) != 0 || !S_ISREG(st.st_mode) ||
+        st.st_size <= static_cast<off_t>(longest_read))
+        return fd;
+    std::string start(longest_read, '\0');
+    ssize_t n = pread(fd, start.data(), start.size(), 0);
+    (void)close(fd);
+    start.resize(static_cast<size_t>(std::max(n, ssize_t(0))));
+    trouble.emplace(canonical, EFBIG);
+    return anonymous_file(start);
+}
+
+int
+velm_simulation::open(const char* path, int flags, mode_t /*mode*/)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(path, true, canonical);
-    if (entry.error != 0 || entry.kind == velm_entry::absent)
-        return fail(entry.error != 0 ? entry.error : ENOENT);
-    if ((flags & O_DIRECTORY) != 0 && entry.kind != velm_entry::directory)
-        return fail(ENOTDIR);
-    int fd = openat(root, relative(canonical).c_str(),
-                    O_RDONLY | O_NONBLOCK | O_NOFOLLOW | O_CLOEXEC | flags);
+    velm_entry entry = resolve(path, (flags & O_NOFOLLOW) == 0, canonical);
+    if (entry.error != 0)
+        return fail(entry.error);
+    bool writing = (flags & O_ACCMODE) != O_RDONLY;
+    if (entry.kind == velm_entry::absent && !(writing && (flags & O_CREAT) != 0))
+        return fail(ENOENT);
+    int fd = writing ? open_for_writing(canonical, entry)
+                     : open_for_reading(canonical, entry, flags);
     if (fd >= 0)
         errno = saved;
     return fd;
 }
 
-// What the real call leaves in errno, too: the error of an open that
-// fails (O_NOFOLLOW refuses a link, a FIFO without a reader refuses a
-// writer), untouched when the open works.
 void
-velm_simulation::write_file(const char* path, const std::string& text) const
+velm_simulation::apply(const velm_command& command)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(path, false, canonical);
-    int error = entry.error != 0                      ? entry.error
-                : entry.kind == velm_entry::link      ? ELOOP
-                : entry.kind == velm_entry::directory ? EISDIR
-                : entry.kind == velm_entry::other     ? ENXIO
-                                                      : 0;
-    errno = error != 0 ? error : saved;
-    // A file with other names is opened, then left alone.
-    if (error == 0 && !entry.shared) {
-        changed[canonical] = velm_entry{velm_entry::file, text, 0, false};
-        writes[canonical] = true;
+    velm_entry entry = resolve(command.verb == velm_command::link ? command.second : command.first,
+                               command.verb == velm_command::copy ||
+                                   command.verb == velm_command::move,
+                               canonical);
+    velm_entry made;
+    made.fresh = true;
+    switch (command.verb) {
+    case velm_command::link:
+        if (entry.kind == velm_entry::directory) // ln puts the link inside
+            canonical += command.first.substr(command.first.rfind('/'));
+        made.kind = velm_entry::link, made.text = command.first;
+        break;
+    case velm_command::remove:
+        if (entry.kind == velm_entry::directory)
+            return;
+        break;
+    case velm_command::remove_tree:
+        break;
+    case velm_command::make_dirs:
+        made.kind = velm_entry::directory;
+        for (size_t slash = 1; slash != std::string::npos;) {
+            slash = command.first.find('/', slash + 1);
+            std::string above;
+            if (resolve(command.first.substr(0, slash), true, above).kind == velm_entry::absent)
+                changed[above] = made;
+        }
+        errno = saved;
+        return;
+    case velm_command::copy:
+    case velm_command::move:
+        if (entry.kind != velm_entry::directory ||
+            look(command.second).kind != velm_entry::absent)
+            return;
+        made = entry, made.text.clear();
+        if (command.verb == velm_command::move)
+            changed[canonical] = velm_entry();
+        canonical.clear();
+        resolve(command.second, false, canonical);
+        break;
+    case velm_command::write:
+        canonical.clear();
+        resolve(command.second, true, canonical);
+        made.kind = velm_entry::file, made.text = command.first + "\n";
+        break;
     }
+    if (entry.error == 0)
+        changed[canonical] = made;
+    errno = saved;
 }
 
 void
-velm_simulation::set_protection_class(const char* path, int /*protection_class*/) const
+velm_simulation::graft(const std::string& path, int outside)
 {
-    // Opened and closed as the real call does, for what that leaves in
-    // errno; the class itself is never set.
-    int fd = open_for_reading(path, 0);
-    if (fd >= 0) // a close(-1) would leave EBADF where the real call leaves the open's error
-        (void)close(fd);
+    std::string canonical;
+    resolve(path, false, canonical);
+    velm_entry copy;
+    copy.kind = velm_entry::directory, copy.base = outside;
+    changed[canonical] = copy;
+}
+
+// A word the shell takes as it stands, or quoted.
+static std::string
+quote(const std::string& word)
+{
+    static const char plain[] = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_./+:=@%,-";
+    if (!word.empty() && word.find_first_not_of(plain) == std::string::npos)
+        return word;
+    std::string out = "'";
+    for (char c : word)
+        out += c == '\'' ? std::string("'\\''") : std::string(1, c);
+    return out + "'";
+}
+
+std::string
+shell_text(const velm_command& c, const std::string& root)
+{
+    std::string first = quote(root + c.first), second = quote(root + c.second);
+    switch (c.verb) {
+    case velm_command::link:
+        return "ln -sfn " + quote(c.first) + " " + second;
+    case velm_command::remove:
+        return "rm -f " + first;
+    case velm_command::remove_tree:
+        return "rm -rf " + first;
+    case velm_command::make_dirs:
+        return "mkdir -p " + first;
+    case velm_command::copy: // once: a second cp -a would copy into the copy
+        return "test -e " + second + " || cp -a " + first + " " + second;
+    case velm_command::move:
+        return "test -e " + second + " || mv " + first + " " + second;
+    case velm_command::write:
+        return "printf '%s\\n' " + quote(c.first) + " >" + second;
+    }
+    return "";
 }

@@ -2,53 +2,119 @@
 // A device tree read through a directory, its root, and never changed:
 // calls that would change it are kept in memory, and later calls see them.
 // Paths and absolute link targets are resolved inside the root, one
-// component at a time, so nothing outside it is ever reached.
+// component at a time, so nothing outside it is ever reached. A change is
+// refused as the kernel would refuse it to the boot: on a read-only file
+// system, an immutable entry, or one the boot's user may not change.
 #ifndef TZLINKS_STATUS_SIMULATION_H
 #define TZLINKS_STATUS_SIMULATION_H
 
 #include "support/fs.h"
 
 #include <map>
+#include <optional>
+#include <set>
 #include <string>
+#include <sys/types.h>
+#include <vector>
 
 // What stands at a path.
 struct velm_entry {
-    enum kind_t { absent, link, file, directory, other } kind = absent;
-    std::string text;    // a link's target; a simulated file's content
-    int error = 0;       // why the path could not be looked up, or 0
-    bool shared = false; // a file with other names (hard links)
+    enum kind_t { absent, link, file, directory, fifo, socket, device } kind = absent;
+    std::string text;       // a link's target; a file's content, when it is a new one
+    int error = 0;          // why the path could not be looked up, or 0
+    bool shared = false;    // a regular file with other names (hard links)
+    bool fresh = false;     // made by the simulation: nothing real stands behind it
+    mode_t mode = 0;        // permission bits
+    int base = -1;          // where it really lies: below this directory ...
+    std::string real;       // ... at this path ("" for base itself, else "/a/b")
 };
+
+// A change made as a person at the shell would make it. The shell text is
+// what a report shows; apply() makes the same change to a simulation.
+struct velm_command {
+    enum verb_t {
+        link,        // ln -sfn FIRST SECOND
+        remove,      // rm -f FIRST
+        remove_tree, // rm -rf FIRST
+        make_dirs,   // mkdir -p FIRST
+        copy,        // cp -a FIRST SECOND (a directory), unless SECOND exists
+        move,        // mv FIRST SECOND, unless SECOND exists
+        write,       // printf '%s\n' FIRST >SECOND
+    } verb;
+    std::string first, second;
+};
+// The command as a shell line, every path of the device below root ("" for
+// the device itself); a link's target is the device's own path.
+std::string shell_text(const velm_command& command, const std::string& root);
 
 class velm_simulation final : public velm_system_calls {
   public:
-    explicit velm_simulation(int root_fd) : root(root_fd) {}
+    explicit velm_simulation(int root_fd);
+    ~velm_simulation() override;
+    velm_simulation(const velm_simulation&) = delete;
+    velm_simulation& operator=(const velm_simulation&) = delete;
 
-    int unlink(const char* path) const override;
-    int access(const char* path) const override;
-    ssize_t readlink(const char* path, char* buffer, size_t size) const override;
-    int symlink(const char* target, const char* path) const override;
-    int remove(const char* path) const override;
-    int open_for_reading(const char* path, int flags) const override;
-    void write_file(const char* path, const std::string& text) const override;
-    void set_protection_class(const char* path, int protection_class) const override;
+    int unlink(const char* path) override;
+    int access(const char* path) override;
+    ssize_t readlink(const char* path, char* buffer, size_t size) override;
+    int symlink(const char* target, const char* path) override;
+    int remove(const char* path) override;
+    int open(const char* path, int flags, mode_t mode) override;
 
     // The entry at path, its last component not followed (or followed).
-    velm_entry look(const std::string& path, bool follow = false) const;
+    velm_entry look(const std::string& path, bool follow = false);
+    // Up to limit bytes of the file at path, following links; none when it
+    // is no regular file or cannot be read. A cut shows as limit bytes.
+    std::optional<std::string> read(const std::string& path, size_t limit);
+    // The names in the directory at path, as a listing shows them now.
+    std::vector<std::string> names(const std::string& path);
+    // Makes a change as a shell command would.
+    void apply(const velm_command& command);
+    // Makes path a copy of the directory below outside, which lies outside
+    // the root (an update about to be staged).
+    void graft(const std::string& path, int outside);
     // Forgets every simulated change.
-    void reset() { changed.clear(); }
-    // Paths written by write_file since the last reset.
-    bool written(const std::string& path) const;
+    void reset();
+    // The simulated changes so far, to come back to.
+    struct changes {
+        std::map<std::string, velm_entry> entries;
+        std::set<std::string> writes;
+    };
+    changes checkpoint();
+    void rewind(const changes& to);
+    // Where path leads inside the root, its last component not followed.
+    std::string where(const std::string& path);
+    // Whether the last run of the boot wrote the file at path.
+    bool written(const std::string& path);
+
+    // Whether changes are judged with the boot's own credentials (root);
+    // otherwise only read-only file systems are foreseen.
+    bool as_boot() const { return as_root; }
+    // Paths the simulation could not read, or read only in part (EFBIG),
+    // with the error; and those it tried again from the beginning.
+    const std::map<std::string, int>& unread() const { return trouble; }
+    void forget_unread() { trouble.clear(); }
 
   private:
-    velm_entry real_entry(const std::string& canonical) const;
-    velm_entry entry_at(const std::string& canonical) const;
-    velm_entry resolve(const std::string& path, bool follow, std::string& canonical) const;
-    bool empty_directory(const std::string& canonical) const;
-    int fail(int error) const;
+    velm_entry real_entry(int base, const std::string& real);
+    velm_entry entry_at(const std::string& canonical);
+    velm_entry resolve(const std::string& path, bool follow, std::string& canonical);
+    int may_change_in(const std::string& directory);
+    int may_write(const velm_entry& entry, int mode);
+    bool unremovable(const velm_entry& entry);
+    int rmdir(const char* path);
+    bool empty_directory(const std::string& canonical);
+    int open_for_writing(const std::string& canonical, const velm_entry& entry);
+    int open_for_reading(const std::string& canonical, const velm_entry& entry, int flags);
+    void settle();
+    int fail(int error);
 
     int root;
-    mutable std::map<std::string, velm_entry> changed; // canonical path -> entry
-    mutable std::map<std::string, bool> writes;
+    bool as_root;
+    std::map<std::string, velm_entry> changed; // canonical path -> entry
+    std::set<std::string> writes;
+    std::vector<std::pair<int, std::string>> pending; // files open for writing
+    std::map<std::string, int> trouble;
 };
 
 #endif

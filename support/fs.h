@@ -1,50 +1,63 @@
 // SPDX-License-Identifier: Apache-2.0
-// File-system primitives. Each one either succeeds or warns on standard
-// error and throws the errno of the failed call as a plain int.
+// File-system primitives, and the seam through which they reach the file
+// system.
 //
-// They live in their own namespace so that velm_fs::remove (unlink, warns
-// and throws) is never confused with the C library's remove(3), which some
-// callers use on purpose because they do not care whether it worked.
+// The primitives live in their own namespace so that velm_fs::remove
+// (unlink, warns and throws) is never confused with the C library's
+// remove(3), which some callers use on purpose because they do not care
+// whether it worked.
 #ifndef TZLINKS_SUPPORT_FS_H
 #define TZLINKS_SUPPORT_FS_H
 
 #include <string>
 #include <sys/types.h>
 
-// The calls the start-up sequence makes on the file system, each as the
-// system call or C library function it stands for: -1 and errno on
-// failure. tzlinks makes them for real; tzlinks-status puts a simulation in
-// their place and runs the very same sequence to show what the next boot
-// will do, without doing it.
+// Every call the boot tool makes on a path goes through this seam, each as
+// the system call or C library function it stands for: -1 and errno on
+// failure. tzlinks makes them for real; tzlinks-status and tzlinks-update
+// put a simulated file system in their place and run the very same start-up
+// sequence to show what the next boot will do, without doing it.
+//
+// Calls on a descriptor (fstat, read, write, ftruncate, close, getdents64,
+// fstatat below a directory, fcntl) do not go through the seam: a
+// simulation hands out real descriptors, of the real file or of an
+// anonymous copy, on which those calls behave as they would at boot.
 class velm_system_calls {
   public:
-    virtual int unlink(const char* path) const;
-    virtual int access(const char* path) const; // F_OK: does it resolve?
-    virtual ssize_t readlink(const char* path, char* buffer, size_t size) const;
-    virtual int symlink(const char* target, const char* path) const;
-    // remove(3): a file, a link or an empty directory.
-    virtual int remove(const char* path) const;
-    // Opens for reading only, never blocking: flags may add O_DIRECTORY.
-    virtual int open_for_reading(const char* path, int flags) const;
-    // Replaces the content of a regular file, created when missing, and
-    // leaves anything else at path alone, a link included (the link is not
-    // followed). Nobody is told whether it worked.
-    virtual void write_file(const char* path, const std::string& text) const;
-    // open, fcntl F_SETPROTECTIONCLASS where the platform has it, close;
-    // every failure ignored.
-    virtual void set_protection_class(const char* path, int protection_class) const;
+    virtual ~velm_system_calls() = default;
+    virtual int unlink(const char* path);
+    virtual int access(const char* path); // F_OK: does it resolve?
+    virtual ssize_t readlink(const char* path, char* buffer, size_t size);
+    virtual int symlink(const char* target, const char* path);
+    virtual int remove(const char* path); // remove(3): a file, a link or an empty directory
+    virtual int open(const char* path, int flags, mode_t mode = 0);
 };
 
-// The calls in use: the real ones unless use_system_calls said otherwise.
-const velm_system_calls& system_calls();
-void use_system_calls(const velm_system_calls& calls);
+// The calls in use: the real ones, but while a velm_calls_in_use lives.
+velm_system_calls& system_calls();
+
+// Puts other calls in use for as long as it lives, on every way out.
+class velm_calls_in_use {
+  public:
+    explicit velm_calls_in_use(velm_system_calls& calls);
+    ~velm_calls_in_use();
+    velm_calls_in_use(const velm_calls_in_use&) = delete;
+    velm_calls_in_use& operator=(const velm_calls_in_use&) = delete;
+
+  private:
+    velm_system_calls* saved;
+};
 
 namespace velm_fs {
+
+// Every primitive below but path_exists and write_own_file warns on
+// standard error and throws the errno of the failed call as a plain int.
 
 // unlink(2); an entry that is already gone is not a failure.
 void remove(const std::string& path);
 
 // access(2) with F_OK: follows links, so a dangling link is "missing".
+// Never warns or throws.
 bool path_exists(const std::string& path);
 
 // readlink(2) into a 1025-byte buffer; targets longer than 1024 bytes are
@@ -53,6 +66,12 @@ std::string read_symlink(const std::string& path);
 
 // symlink(2), target first as in the system call. Never replaces an entry.
 void create_symlink(const std::string& target, const std::string& link_path);
+
+// Replaces the content of the regular file at path, created when missing,
+// and leaves anything else there alone: a link (not followed), a FIFO, a
+// device, a directory, or a file with other names. Never warns or throws;
+// nobody is told whether it worked.
+void write_own_file(const std::string& path, const std::string& text);
 
 } // namespace velm_fs
 

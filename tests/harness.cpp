@@ -26,7 +26,8 @@ fresh_tree()
     std::getline(std::ifstream("/proc/self/uid_map"), map);
     return map.find("4294967295") == std::string::npos &&
            mount("tzlinks-test", "/var", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
-           mount("tzlinks-test", "/usr/share", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0;
+           mount("tzlinks-test", "/usr/share", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
+           mount("tzlinks-test", "/etc", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0;
 }
 
 bool

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-// Puts empty file systems over /var and /usr/share; false when refused,
+// Puts empty file systems over /var, /usr/share and /etc; false when refused,
 // and always outside a user namespace of the tests' own.
 bool fresh_tree();
 // Runs the sample-tree builders (tools/sample-tree.sh) on the fixed paths.

@@ -7,6 +7,7 @@
 // does, as a report of the tree afterwards shows it.
 #include "harness.h"
 
+#include <fstream>
 #include <gtest/gtest.h>
 #include <regex>
 #include <unistd.h>
@@ -27,7 +28,7 @@ TEST_P(tool, row)
 {
     const row& r = GetParam();
     ASSERT_TRUE(fresh_tree());
-    ASSERT_TRUE(build_tree("system_dataset 2023c 44l\n" + r.tree)) << r.tree;
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree)) << r.tree;
     auto before = snapshot(true), plain_before = snapshot();
     std::string report = run(program(TZLINKS_STATUS_BINARY, "--json")).out;
     EXPECT_EQ(snapshot(true), before) << "tzlinks-status changed the tree";
@@ -37,8 +38,11 @@ TEST_P(tool, row)
                   between(report, "\"health\":\"", "\"") + (ids.empty() ? "" : ":" + ids),
               r.health);
     std::string copy =
-        run("d=$(mktemp -d) && cd / && cp -a --parents var usr/share $d && printf $d").out;
+        run("d=$(mktemp -d) && cd / && cp -a --parents var usr/share etc $d && printf $d").out;
     outcome through_root = run(program(TZLINKS_STATUS_BINARY, "--json --root " + copy));
+    // Its commands name the copy's paths; nothing else may differ.
+    for (size_t at; (at = through_root.out.find(copy)) != std::string::npos;)
+        through_root.out.erase(at, copy.size());
     EXPECT_EQ(through_root.out, report) << "the report differs through --root";
     char health_ = r.health.at(r.health.find(':') + 1); // h, d or b
     EXPECT_EQ(through_root.status, health_ == 'h' ? 0 : health_ == 'd' ? 1 : 2);
@@ -63,7 +67,27 @@ TEST_P(tool, row)
     }
     if (getenv("TZLINKS_FAULTS") != nullptr && r.inject.empty())
         try_faults(copy + "/var");
-    run("rm -rf " + copy);
+
+    // The repairs, on the tree as it was: every finding's commands, then one
+    // boot. The report then is the one foretold, and its only errors are
+    // those that need a person; no command shown failed its own check.
+    EXPECT_FALSE(std::regex_search(report, std::regex(R"("commands":\[[^\]]*\],"manual":)"
+                                                      R"((null|"[^"]*"),"verified":false)")))
+        << "a repair that the simulation does not show to work";
+    run("rm -rf /var/* /usr/share/* /etc/* && cd " + copy +
+        " && cp -a var/. /var && cp -a usr/share/. /usr/share && cp -a etc/. /etc");
+    std::ofstream(copy + ".sh") << run(program(TZLINKS_STATUS_BINARY, "--commands")).out;
+    EXPECT_EQ(run("exec sh -e " + copy + ".sh").status, 0);
+    run(tzlinks());
+    std::string repaired = run(program(TZLINKS_STATUS_BINARY, "--json")).out;
+    EXPECT_EQ("\"health\":\"" + between(repaired, "\"health\":\"", "\"") + "\",\"findings\":[" +
+                  std::regex_replace(between(repaired, "\"findings\":[", "],\"health\""),
+                                     std::regex("\\{\"id\":(\"[^\"]*\")[^}]*\\}"), "$1") + "]",
+              between(report, "\"after_repair\":{", "}"));
+    EXPECT_FALSE(std::regex_search(repaired, std::regex(R"("severity":"error","message":")"
+                                                        R"(([^"\\]|\\.)*","commands":\[)")))
+        << "the repairs leave an error with commands: " << repaired;
+    run("rm -rf " + copy + " " + copy + ".sh");
 }
 
 INSTANTIATE_TEST_SUITE_P(tzlinks, tool, ::testing::ValuesIn(load_rows()),
@@ -84,10 +108,16 @@ const std::string not_utf8 =
 // \xHH in text, a quote and a backslash escaped in JSON only.
 TEST(status, command_line)
 {
-    const std::string usage = "usage: tzlinks-status [--json] [--root DIR]\n"
+    const std::string usage = "usage: tzlinks-status [--json | --commands] [--root DIR]\n"
                               "       tzlinks-status --help | --version\n";
     const std::tuple<std::string, int, std::string, std::string> uses[] = {
         {"--help", 0, usage + "Reports which time-zone data a device uses", ""},
+        {"-h", 0, usage + "Reports which time-zone data a device uses", ""},
+        {"--json --commands", 64, "",
+         "tzlinks-status: given with another form: --commands\n" + usage},
+        {"--root=/ --root /", 64, "", "tzlinks-status: given twice: --root\n" + usage},
+        {"--root /proc/self", 66, "",
+         "tzlinks-status: /proc/self holds no device tree: no var/ and usr/share/ below it\n"},
         {"--version", 0, "tzlinks-status " TZLINKS_VERSION "\n", ""},
         {"-x", 64, "", "tzlinks-status: unknown argument: -x\n" + usage},
         {"--json --root", 64, "", "tzlinks-status: missing directory after: --root\n" + usage},
@@ -102,8 +132,13 @@ TEST(status, command_line)
     }
     ASSERT_TRUE(fresh_tree());
     ASSERT_TRUE(build_tree("system_dataset 2023c 44l; live_system"));
-    std::string target = "/x/\x01\x7f\"\\" + utf8, text = "/x/\\x01\\x7f\"\\" + utf8,
-                json = "/x/\\u0001\x7f\\\"\\\\" + utf8;
+    // C1 controls (U+0080 to U+009F, a terminal's CSI among them) are escaped
+    // in text as C0 ones are; U+00A0 is not.
+    std::string c1 = "\xc2\x9b/\xc2\xa0";
+    std::string target = "/x/\x01\x7f\"\\" + c1 + utf8,
+                text = "/x/\\x01\\x7f\"\\\\xc2\\x9b/\xc2\xa0" +
+                       std::regex_replace(utf8, std::regex("\xc2\x80"), "\\xc2\\x80"),
+                json = "/x/\\u0001\x7f\\\"\\\\" + c1 + utf8;
     for (char c : not_utf8) {
         std::string hex = {"0123456789abcdef"[(c >> 4) & 15], "0123456789abcdef"[c & 15]};
         target += c, text += c == '/' ? "/" : "\\x" + hex, json += c == '/' ? "/" : "\\udc" + hex;

@@ -53,7 +53,9 @@ update_dataset() {
     put_file "$root/zoneinfo/+VERSION" "${1%%.*}
 "
     put_zones "$root/zoneinfo"
-    put_file "$root/icutz/icutz$2.dat" "icu-data"
+    # What ICU's data files begin with: a header size, then 0xda 0x27.
+    put_file "$root/icutz/icutz$2.dat" '\0040\0000\0332\0047icu-data'
+
 }
 
 # Shortcuts for whole device states (links of the live dataset and a
@@ -78,6 +80,11 @@ latest() {
     put_link $tz/tz/$1 $tz/tz_latest
 }
 
+# /etc/localtime as an image has it: through the boot's localtime link.
+etc_localtime() {
+    put_link $tz/localtime /etc/localtime
+}
+
 # The demo's device, as an image leaves it before its first boot: system
 # data 2023c live, an update 2024a.1.0 named by tz_latest, and the links of
 # an older system (localtime into /usr/share/zoneinfo, /var/db/icutz).
@@ -88,4 +95,5 @@ demo_device() {
     latest 2024a.1.0
     put_link /usr/share/zoneinfo/Europe/Paris $tz/localtime
     put_link /usr/share/icu /var/db/icutz
+    etc_localtime
 }

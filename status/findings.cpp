@@ -1,0 +1,681 @@
+// SPDX-License-Identifier: Apache-2.0
+// What is wrong with a device tree, each with the repairs a person can
+// make. What a boot does is always read off its simulated run (the links it
+// leaves, the lines it writes); the facts of the tree only say why.
+#include "status/report.h"
+
+#include "dataset/icu.h"
+#include "driver/startup.h"
+#include "support/paths.h"
+#include "support/prefix.h"
+#include "support/version.h"
+
+#include <algorithm>
+#include <cstring>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+const char spaces[] = " \t\n\v\f\r";
+
+velm_command
+ln(const std::string& target, const std::string& path)
+{
+    return {velm_command::link, target, path};
+}
+
+// Removes whatever stands at path: rm -f, or rm -rf for a directory. The
+// tree decides which, as it stands before any repair.
+velm_simulation* before_repair = nullptr;
+
+velm_command
+rm(const std::string& path)
+{
+    bool tree = before_repair->look(path).kind == velm_entry::directory;
+    return {tree ? velm_command::remove_tree : velm_command::remove, path, ""};
+}
+
+// What makes path a link to target: ln -sfn replaces anything but a
+// directory, which has to go first.
+velm_commands
+relink(const std::string& target, const std::string& path)
+{
+    velm_commands commands;
+    if (before_repair->look(path).kind == velm_entry::directory)
+        commands.push_back(rm(path));
+    commands.push_back(ln(target, path));
+    return commands;
+}
+
+// What clears path for a new entry: nothing when nothing stands there.
+velm_commands
+clear(const std::string& path)
+{
+    return before_repair->look(path).kind == velm_entry::absent ? velm_commands() : velm_commands{rm(path)};
+}
+
+std::string
+quoted(const velm_text& text)
+{
+    return text ? "\"" + *text + "\"" : "nothing";
+}
+
+std::string
+schema(const std::string& text)
+{
+    return text.empty() ? "none" : text;
+}
+
+std::string
+parent_of(const std::string& path)
+{
+    return path.substr(0, path.rfind('/'));
+}
+
+// The update a path lies in, "/var/db/timezone/tz/NAME", or "".
+std::string
+update_of(const velm_text& path)
+{
+    static const size_t prefix = sizeof velm_path::updates - 1;
+    if (!path || path->size() <= prefix || !has_prefix(*path, velm_path::updates) ||
+        (*path)[prefix] == '/')
+        return "";
+    return path->substr(0, path->find('/', prefix));
+}
+
+// Whether the run wrote a line that begins with text.
+bool
+said(const velm_run& run, const char* text)
+{
+    std::string start = std::string("tzlinks: ") + text;
+    for (const std::string& message : run.messages) {
+        if (has_prefix(message, start.c_str()))
+            return true;
+    }
+    return false;
+}
+
+// What a run leaves, in words.
+std::string
+what_it_does(const velm_run& run)
+{
+    if (run.action == "adopt")
+        return "adopts " + update_of(run.zoneinfo).substr(sizeof velm_path::updates - 1);
+    if (run.action == "fail")
+        return "fails";
+    return run.zoneinfo == velm_path::system_zoneinfo ? "links the system data"
+                                                     : "keeps the data in use";
+}
+
+// A report's findings are made while the simulation stands as the tree is
+// now, or as the next boot leaves it: each look says which.
+struct finder {
+    velm_simulation& tree;
+    velm_report& r;
+
+    velm_finding& add(const char* severity, const char* id, const std::string& subject,
+                      const std::string& message)
+    {
+        velm_finding finding;
+        finding.severity = severity, finding.id = id, finding.subject = subject;
+        finding.message = message;
+        r.findings.push_back(finding);
+        return r.findings.back();
+    }
+    velm_simulation& now()
+    {
+        tree.rewind(r.now);
+        return tree;
+    }
+    velm_simulation& next()
+    {
+        tree.rewind(r.next);
+        return tree;
+    }
+};
+
+velm_entry::kind_t
+kind(velm_simulation& tree, const std::string& path, bool follow = false)
+{
+    return tree.look(path, follow).kind;
+}
+
+bool
+zone_file(velm_simulation& tree, const std::string& path)
+{
+    return tree.read(path, 4) == "TZif";
+}
+
+// The first word of a file, from its first few kilobytes.
+std::string
+first_word(velm_simulation& tree, const std::string& path)
+{
+    std::string text = tree.read(path, longest_text).value_or("");
+    size_t begin = std::min(text.find_first_not_of(spaces), text.size());
+    return text.substr(begin, text.find_first_of(spaces, begin) - begin);
+}
+
+// The release a tz database's own source names on its first line, as
+// "# version 2025b"; for a database whose +VERSION is missing or wrong.
+std::string
+release_in(velm_simulation& tree, const std::string& directory)
+{
+    std::string text = tree.read(directory + "/tzdata.zi", 64).value_or("");
+    static const char mark[] = "# version ";
+    if (!has_prefix(text, mark))
+        return "";
+    std::string word = text.substr(sizeof mark - 1, text.find_first_of(spaces, sizeof mark - 1) -
+                                                        (sizeof mark - 1));
+    return velm_version_match_text(word).size == 5 ? word : "";
+}
+
+bool
+tz_database(velm_simulation& tree, const std::string& directory)
+{
+    for (const char* name : {"/tzdata.zi", "/zone1970.tab", "/zone.tab", "/+VERSION"}) {
+        if (kind(tree, directory + name, true) == velm_entry::file)
+            return true;
+    }
+    return false;
+}
+
+// Where readers of the device find its data, or the tool does its work.
+void
+find_places(finder& f)
+{
+    velm_simulation& tree = f.now();
+    if (!tree.as_boot())
+        f.add("note", "unverified", "",
+              "tzlinks-status runs as user " + std::to_string(geteuid()) +
+                  ", not as root as the boot does: the kernel was not asked whether the boot may "
+                  "change the tree, and what only root may read was not read; the prediction "
+                  "takes it that root may.");
+    velm_entry directory = tree.look(velm_path::link_directory, true);
+    if (directory.kind != velm_entry::directory) {
+        velm_finding& no = f.add(
+            "error", "no-timezone-directory", velm_path::link_directory,
+            std::string(velm_path::link_directory) +
+                (directory.kind == velm_entry::absent ? " is missing" : " is no directory") +
+                ": the boot cannot link any data, not even the system's.");
+        velm_commands make = clear(velm_path::link_directory);
+        make.push_back({velm_command::make_dirs, velm_path::updates, ""});
+        no.tries = {make};
+    }
+    if (kind(tree, velm_path::system_zoneinfo, true) == velm_entry::directory)
+        return;
+    bool instead = kind(tree, velm_path::legacy_zoneinfo) == velm_entry::directory &&
+                   tz_database(tree, velm_path::legacy_zoneinfo);
+    std::string release = release_in(tree, velm_path::legacy_zoneinfo);
+    velm_finding& no = f.add(
+        "error", "no-system-data", velm_path::system_zoneinfo,
+        std::string(velm_path::system_zoneinfo) +
+            " is no directory: there is no system tz database to fall back on" +
+            (instead ? std::string("; ") + velm_path::legacy_zoneinfo + " holds one" +
+                           (release.empty() ? "" : " (release " + release + ")")
+                     : std::string(", nor in ") + velm_path::legacy_zoneinfo) +
+            ".");
+    no.manual = std::string("a compiled tz database at ") + velm_path::system_zoneinfo +
+                ", with its release, such as 2025b, as the first word of its +VERSION";
+    std::string version = std::string(velm_path::system_zoneinfo) + "/+VERSION";
+    if (instead) {
+        velm_commands copy = clear(velm_path::system_zoneinfo);
+        copy.push_back({velm_command::copy, velm_path::legacy_zoneinfo, velm_path::system_zoneinfo});
+        if (!release.empty() &&
+            first_word(tree, velm_path::legacy_zoneinfo + std::string("/+VERSION")).empty())
+            copy.push_back({velm_command::write, release, version});
+        no.tries = {copy};
+    }
+}
+
+// What the report and the boot could not read.
+void
+find_unread(finder& f, const std::map<std::string, int>& unread)
+{
+    for (const auto& [path, error] : unread) {
+        if (error == EFBIG) {
+            f.add("note", "read-in-part", path,
+                  path + " is longer than 64 KiB: only its start was read, and the prediction "
+                         "takes it as that long.");
+            continue;
+        }
+        // Only a loop of links or an over-long name stops root: what to do
+        // about the link that leads there, the other findings say.
+        bool boot_reads = !f.tree.as_boot() && (error == EACCES || error == EPERM);
+        bool note = boot_reads || error == ELOOP || error == ENAMETOOLONG;
+        velm_finding& found =
+            f.add(note ? "note" : "warning", "unreadable", path,
+                  path + " cannot be read: " + strerror(error) +
+                      (boot_reads ? " (by this user; the boot, as root, may read it)" : "") +
+                      ": what lies behind it counts as missing in this report.");
+        if (!note)
+            found.manual = "read access for root to " + path + ", or its removal";
+    }
+}
+
+void
+find_system_version(finder& f)
+{
+    velm_simulation& tree = f.now();
+    if (kind(tree, velm_path::system_zoneinfo, true) != velm_entry::directory ||
+        (f.r.system.present && f.r.system.version_understood))
+        return;
+    std::string version = std::string(velm_path::system_zoneinfo) + "/+VERSION";
+    velm_finding& found =
+        !f.r.system.present
+            ? f.add("error", "system-version", version,
+                    "The first word of " + version +
+                        " holds a number too large for a version: not even the system data can "
+                        "be linked.")
+            : f.add("warning", "system-version", version,
+                    "The system data's version is \"" + f.r.system.version +
+                        "\", which is not a version: every boot warns about it, the system data "
+                        "orders below every update, and the data in use is never found older "
+                        "than it.");
+    found.manual = "the release of the tz database in " + std::string(velm_path::system_zoneinfo) +
+                   ", such as 2025b, as the first word of its +VERSION";
+    std::string release = release_in(tree, velm_path::system_zoneinfo);
+    if (release.empty())
+        return;
+    velm_commands write = tree.look(version).kind == velm_entry::file ? velm_commands()
+                                                                      : clear(version);
+    write.push_back({velm_command::write, release, version});
+    found.tries = {write};
+}
+
+// The data in use, as the zoneinfo link names it.
+void
+find_live(finder& f)
+{
+    const velm_report& r = f.r;
+    velm_simulation& tree = f.now();
+    std::string consequence = "the next boot " + what_it_does(r.next_boot);
+    velm_commands reset = {rm(velm_path::zoneinfo_link)};
+    velm_commands system = {rm(velm_path::zoneinfo_link), rm(velm_path::latest_link)};
+    if (kind(tree, velm_path::zoneinfo_link, true) != velm_entry::directory) {
+        f.add("error", "zoneinfo-unusable", velm_path::zoneinfo_link,
+              std::string(velm_path::zoneinfo_link) + " names " + quoted(r.zoneinfo) +
+                  ", which leads to no tz database: programs have none; " + consequence + ".")
+            .tries = {{}, reset, system};
+    } else if (said(r.next_boot, velm_says::invalid_current)) {
+        f.add("warning", "zoneinfo-not-understood", velm_path::zoneinfo_link,
+              std::string(velm_path::zoneinfo_link) + " names " + quoted(r.zoneinfo) +
+                  ", which is neither an update below " + velm_path::updates + " nor " +
+                  velm_path::system_zoneinfo + ": " + consequence + ".")
+            .tries = {{}, reset, system};
+    }
+    if (!said(r.next_boot, velm_says::incompatible))
+        return;
+    std::string why =
+        !r.live.present ? "has a version number too large"
+        : !r.live.compatible
+            ? "has ICU schema " + schema(r.live.icu_schema) + ", the system data " +
+                  schema(r.system.icu_schema)
+        : !r.live.version_understood
+            ? "is named \"" + r.live.version + "\", which is not a version and counts as older "
+                                               "than the system data"
+            : "is older than the system data, " + r.system.version;
+    f.add("warning", "live-rejected", velm_path::zoneinfo_link,
+          "The data in use, " + (r.live.present ? r.live.version : r.live.root) + ", " + why +
+              ": the next boot sets it aside and " + what_it_does(r.next_boot) + ".")
+        .tries = {{}, {rm(velm_path::latest_link)}};
+}
+
+// Why the update tz_latest names is not adopted, or not for good.
+void
+find_latest(finder& f)
+{
+    const velm_report& r = f.r;
+    velm_simulation& tree = f.now();
+    velm_entry entry = tree.look(velm_path::latest_link);
+    if (entry.kind == velm_entry::absent)
+        return;
+    const velm_run& next = r.next_boot;
+    const velm_dataset_facts& latest = r.latest;
+    std::string target = r.tz_latest.value_or("");
+    velm_commands unlink = {rm(velm_path::latest_link)};
+    if (!latest.present) {
+        std::string why =
+            entry.kind != velm_entry::link ? "is no link"
+            : !has_prefix(target, "/")
+                ? "names \"" + target + "\": a relative target is never understood"
+            : !has_prefix(target, velm_path::updates) || update_of(target).empty()
+                ? "names \"" + target + "\", which is no update below " + velm_path::updates
+                : "names " + target + ", whose version holds a number too large";
+        velm_finding& found =
+            f.add("warning", "latest-not-understood", velm_path::latest_link,
+                  std::string(velm_path::latest_link) + " " + why + ": the next boot " +
+                      (said(next, velm_says::unable) ? "gives up its choice and links the system "
+                                                       "data"
+                                                     : what_it_does(next)) +
+                      ".");
+        std::string meant = tree.where(std::string(velm_path::link_directory) + "/" + target);
+        if (entry.kind == velm_entry::link && !has_prefix(target, "/") &&
+            update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
+            found.tries.push_back({ln(meant, velm_path::latest_link)});
+        found.tries.push_back(unlink);
+        return;
+    }
+    if (r.live.present && latest.root == r.live.root && next.action == "keep") {
+        f.add("note", "latest-in-use", latest.root,
+              "tz_latest names the data in use, " + latest.version + "; every boot says so.");
+        return;
+    }
+    bool refused = said(next, velm_says::refused);
+    if (!refused && !(next.action == "adopt" && latest.older))
+        return;
+    std::string name = "tz_latest names " + latest.version;
+    velm_commands to_live = r.live.present && !r.live.root.empty()
+                                ? velm_commands{ln(r.live.root, velm_path::latest_link)}
+                                : unlink;
+    if (target.back() == '/') {
+        f.add("warning", "latest-trailing-slash", latest.root,
+              "tz_latest names \"" + target +
+                  "\", with a trailing slash: its version is then \"" + latest.version +
+                  "\", which is not a version, and no boot adopts it.")
+            .tries = {{ln(target.substr(0, target.find_last_not_of('/') + 1),
+                          velm_path::latest_link)}};
+    } else if (kind(tree, latest.root, true) != velm_entry::directory) {
+        f.add("warning", "latest-missing", latest.root,
+              "tz_latest names " + latest.root + ", which does not exist: no boot adopts it.")
+            .tries = {to_live, unlink};
+    } else if (!latest.version_understood) {
+        velm_finding& found =
+            f.add("warning", "latest-not-a-version", latest.root,
+                  name + ", a name that is not a version (such as 2025b.1.0): no boot adopts it.");
+        std::string word = first_word(tree, latest.root + "/zoneinfo/+VERSION");
+        std::string renamed = velm_path::updates + word + ".1.0";
+        found.manual = "a version as the name of " + latest.root + ", such as " +
+                       (word.empty() ? "2025b" : word) + ".1.0";
+        if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
+            kind(tree, renamed) == velm_entry::absent)
+            found.tries = {{{velm_command::move, latest.root, renamed},
+                            ln(renamed, velm_path::latest_link)}};
+    } else if (!latest.compatible) {
+        std::string want = r.system.icu_schema;
+        std::string data = latest.root + "/icutz/icutz" + want + ".dat";
+        f.add("warning", latest.icu_schema.empty() ? "latest-no-icu" : "latest-other-schema",
+              latest.root,
+              latest.icu_schema.empty()
+                  ? name + ", which has no ICU data the boot can use (a regular file " + data +
+                        ", readable by others): no boot adopts it."
+                  : name + ", whose ICU data has schema " + latest.icu_schema +
+                        "; the system's is " + schema(want) + ": no boot adopts it.")
+            .manual = "ICU data built for schema " + want + ", as " + data +
+                      ", a regular file readable by others";
+    } else if (latest.older) {
+        f.add("warning", "latest-older-than-system", latest.root,
+              name + ", older than the system data, " + r.system.version +
+                  (refused ? ": no boot adopts it."
+                           : ": the next boot adopts it, the data in use being older still, and "
+                             "the boot after sets it aside."))
+            .tries = {unlink};
+    } else {
+        f.add("warning", "latest-older", latest.root,
+              name + ", which is not newer than the data in use, " + r.live.version +
+                  ": no boot adopts it.")
+            .tries = {to_live, unlink};
+    }
+}
+
+// The file icutz<schema>.dat that the boot would find, directly in it.
+std::string
+icu_data_in(velm_simulation& tree, const std::string& directory)
+{
+    for (const std::string& name : tree.names(directory)) {
+        velm_entry entry = tree.look(directory + "/" + name);
+        if (!velm_icu_schema_in_name(name).empty() && entry.kind == velm_entry::file &&
+            (entry.mode & S_IROTH) != 0)
+            return directory + "/" + name;
+    }
+    return "";
+}
+
+// The updates unpacked below tz/: those no link names, and what is wrong
+// inside those the links name.
+void
+find_updates(finder& f)
+{
+    const velm_report& r = f.r;
+    std::vector<std::string> named;
+    for (const velm_text& link : {r.zoneinfo, r.icutz, r.tz_latest, r.next_boot.zoneinfo,
+                                  r.next_boot.icutz})
+        named.push_back(update_of(link));
+    velm_simulation& tree = f.now();
+    for (const std::string& name : tree.names(velm_path::updates)) {
+        std::string root = velm_path::updates + name;
+        if (std::find(named.begin(), named.end(), root) == named.end()) {
+            f.add("note", "update-unnamed", root,
+                  root + " is an update that no link names: nothing uses it.")
+                .tries = {{rm(root)}};
+            continue;
+        }
+        velm_version_match match = velm_version_match_text(name);
+        std::string word = first_word(tree, root + "/zoneinfo/+VERSION");
+        if (match.size == 5 && !word.empty() && word != match.group[1] + match.group[2])
+            f.add("warning", "version-mismatch", root,
+                  root + " holds the tz database " + word +
+                      " (the first word of its +VERSION), though its name says " +
+                      match.group[1] + match.group[2] + ": the boot orders it by its name.")
+                .manual = "the tz database of release " + match.group[1] + match.group[2] +
+                          " in " + root + "/zoneinfo, or a directory named for release " + word;
+        std::string data = icu_data_in(tree, root + "/icutz");
+        std::string head = data.empty() ? "" : tree.read(data, 4).value_or("");
+        if (!data.empty() && (head.size() < 4 || head.compare(2, 2, "\xda\x27") != 0))
+            f.add("warning", "icu-data-bad", data,
+                  data + (head.empty() ? " is empty" : " is no ICU data (it lacks the header "
+                                                       "ICU's data files begin with)") +
+                      ": the boot goes by its name alone and uses it, and ICU's readers then "
+                      "fail.")
+                .manual = "ICU data built by ICU's tools as " + data;
+    }
+}
+
+// The next boot, and the links it leaves.
+void
+find_next_boot(finder& f)
+{
+    const velm_report& r = f.r;
+    const velm_run& next = r.next_boot;
+    velm_commands system = {rm(velm_path::zoneinfo_link), rm(velm_path::latest_link)};
+    if (next.exit_status != 0) {
+        // The entry it could not change, and why, from its last words.
+        std::string failed, why;
+        for (const std::string& message : next.messages) {
+            for (const char* call : {"create_symlink: from ", "remove: could not remove "}) {
+                std::string start = std::string("tzlinks: ") + call;
+                if (has_prefix(message, start.c_str())) {
+                    failed = message.substr(start.size());
+                    failed = failed.substr(0, failed.find(' '));
+                    why = message.substr(message.rfind(": ") + 2);
+                }
+            }
+        }
+        velm_finding& found = f.add(
+            "error", "next-boot-fails", "",
+            "The next boot cannot even link the system data" +
+                (failed.empty() ? std::string() : " (" + failed + ": " + why + ")") +
+                ": it exits with status " + std::to_string(next.exit_status) +
+                " and leaves localtime as it is.");
+        if (why == strerror(EROFS) || why == strerror(EACCES) || why == strerror(EPERM))
+            found.manual = "write access for root to " + parent_of(failed) +
+                           (why == strerror(EROFS) ? ", on a file system mounted read-write" : "");
+        else if (!failed.empty())
+            found.tries = {clear(failed), {{velm_command::make_dirs, velm_path::updates, ""}}};
+        return;
+    }
+    velm_simulation& tree = f.next();
+    bool usable_now = kind(f.now(), velm_path::zoneinfo_link, true) == velm_entry::directory;
+    if (usable_now && kind(f.next(), velm_path::zoneinfo_link, true) != velm_entry::directory)
+        f.add("error", "next-boot-unusable", velm_path::zoneinfo_link,
+              "The next boot links zoneinfo to " + quoted(next.zoneinfo) +
+                  ", where there is no tz database: programs would fall back to UTC.")
+            .tries = {{rm(velm_path::latest_link)}, system};
+    std::string update = update_of(next.zoneinfo);
+    bool icutz = kind(f.next(), velm_path::icutz_link) != velm_entry::absent;
+    if (!update.empty() && next.icutz != update + "/icutz")
+        f.add("warning", icutz ? "icutz-stale" : "icutz-missing", velm_path::icutz_link,
+              "icutz names " + quoted(next.icutz) + ", not the ICU data of the update in use, " +
+                  update + ": ICU's readers use other data than the tz database, and no boot "
+                           "changes that.")
+            .tries = {relink(update + "/icutz", velm_path::icutz_link)};
+    else if (update.empty() && icutz)
+        f.add("warning", "icutz-with-system", velm_path::icutz_link,
+              "icutz is there while the system data is in use: ICU's readers use data that is "
+              "not the system's, and no boot changes that.")
+            .tries = {{rm(velm_path::icutz_link)}};
+    (void)tree;
+}
+
+// The zone a localtime link means, wherever its target lies: what follows
+// the live tree, the system's tree or an update's tree in it.
+std::string
+zone_meant(velm_simulation& tree, const velm_text& target)
+{
+    if (!target)
+        return "";
+    std::string at = has_prefix(*target, "/")
+                         ? *target
+                         : std::string(velm_path::link_directory) + "/" + *target;
+    for (const std::string& tree_of : {std::string(velm_path::zoneinfo_link),
+                                       std::string(velm_path::legacy_zoneinfo) + ".default",
+                                       std::string(velm_path::legacy_zoneinfo)}) {
+        if (has_prefix(at, (tree_of + "/").c_str()))
+            return at.substr(tree_of.size() + 1);
+    }
+    std::string real = tree.where(at);
+    std::string update = update_of(real);
+    std::string top = update.empty() ? velm_path::system_zoneinfo : update + "/zoneinfo";
+    return has_prefix(real, (top + "/").c_str()) ? real.substr(top.size() + 1) : "";
+}
+
+void
+find_localtime(finder& f)
+{
+    const velm_report& r = f.r;
+    const velm_run& next = r.next_boot;
+    bool usable_now = zone_file(f.now(), velm_path::localtime_link);
+    std::string zone = zone_meant(f.now(), r.localtime);
+    bool usable_next = zone_file(f.next(), velm_path::localtime_link);
+    std::string live = std::string(velm_path::zoneinfo_link) + "/";
+    velm_commands to_zone = relink(live + zone, velm_path::localtime_link);
+    std::string manual = "a link " + std::string(velm_path::localtime_link) + " to " + live +
+                         "<zone>, naming a zone file of the data in use";
+    if (!usable_now || !usable_next) {
+        velm_finding& found = f.add(
+            "error", "localtime-unusable", velm_path::localtime_link,
+            "localtime names " + quoted(r.localtime) +
+                (usable_now ? ", a zone file" : ", which is no link to a zone file") +
+                "; the next boot leaves " + quoted(next.localtime) +
+                (usable_next ? "." : (usable_now ? ", which leads to none." : ", which is none either.")));
+        found.manual = manual;
+        found.tries = {{}};
+        if (!zone.empty())
+            found.tries.push_back(to_zone);
+        found.tries.push_back({rm(velm_path::localtime_link)});
+    } else if (next.localtime != r.localtime && next.localtime == velm_path::default_localtime) {
+        bool legacy = r.localtime &&
+                      has_prefix(*r.localtime, (velm_path::system_zoneinfo + std::string("/")).c_str());
+        velm_finding& found =
+            f.add("warning", legacy ? "localtime-legacy-default" : "localtime-reset",
+                  velm_path::localtime_link,
+                  "localtime names " + quoted(r.localtime) +
+                      ", which the next boot does not accept: it sets the zone to " +
+                      velm_path::default_zone + ".");
+        found.manual = manual;
+        if (!zone.empty())
+            found.tries = {to_zone};
+    }
+}
+
+// Whether programs read the device's zone: /etc/localtime must lead through
+// the boot's localtime link. A tree without /etc (a copy of var/ and
+// usr/share/ alone) has no say in it.
+void
+find_etc_localtime(finder& f)
+{
+    velm_simulation& tree = f.now();
+    if (kind(tree, "/etc", true) != velm_entry::directory)
+        return;
+    std::string goal = tree.where(velm_path::localtime_link), at = velm_path::etc_localtime;
+    bool through = false;
+    for (int hops = 0; hops < 40 && !through; ++hops) {
+        std::string here = tree.where(at);
+        through = here == goal;
+        velm_entry entry = tree.look(here);
+        if (entry.kind != velm_entry::link)
+            break;
+        at = has_prefix(entry.text, "/") ? entry.text : parent_of(here) + "/" + entry.text;
+    }
+    if (through)
+        return;
+    bool missing = kind(tree, velm_path::etc_localtime) == velm_entry::absent;
+    f.add("warning", "etc-localtime", velm_path::etc_localtime,
+          std::string(velm_path::etc_localtime) +
+              (missing ? " is missing: programs use UTC, not the device's zone."
+                       : " does not lead through " + std::string(velm_path::localtime_link) +
+                             ": programs use another zone than the device's."))
+        .tries = {relink(velm_path::localtime_link, velm_path::etc_localtime)};
+}
+
+void
+find_record(finder& f)
+{
+    const velm_report& r = f.r;
+    velm_simulation& tree = f.now();
+    velm_entry record = tree.look(velm_path::record);
+    if (record.kind != velm_entry::absent && (record.kind != velm_entry::file || record.shared))
+        f.add("warning", "record-not-a-file", velm_path::record,
+              std::string(velm_path::record) +
+                  " is no regular file of its own: no adoption is ever recorded there.")
+            .tries = {{rm(velm_path::record)}};
+    // An adoption writes the record last: cut short, or failed, it leaves
+    // the record of an earlier one. (No record at all is what an image
+    // made with an update in place looks like.)
+    std::string adopted = "_" + r.live.version;
+    if (r.next_boot.action == "keep" && !update_of(r.next_boot.zoneinfo).empty() &&
+        r.live.present && r.record &&
+        (r.record->size() < adopted.size() ||
+         r.record->compare(r.record->size() - adopted.size(), std::string::npos, adopted) != 0))
+        f.add("note", "record-stale", velm_path::record,
+              "The record reads \"" + *r.record + "\", which does not name the adoption of " +
+                  r.live.version + ", the update in use.");
+}
+
+void
+find_legacy(finder& f)
+{
+    for (const char* legacy : {velm_path::legacy_icu_link, velm_path::legacy_icu}) {
+        if (kind(f.now(), legacy) == velm_entry::absent)
+            continue;
+        bool stays = kind(f.next(), legacy) != velm_entry::absent;
+        velm_finding& found =
+            f.add("note", "legacy-entries", legacy,
+                  std::string(legacy) + (stays ? " is still there, and the next boot leaves it."
+                                               : " is still there; the next boot clears it away."));
+        if (stays)
+            found.tries = {{rm(legacy)}};
+    }
+}
+
+} // namespace
+
+void
+find_problems(velm_simulation& tree, velm_report& r)
+{
+    std::map<std::string, int> unread = tree.unread();
+    finder f{tree, r};
+    before_repair = &f.now();
+    find_places(f);
+    find_unread(f, unread);
+    find_system_version(f);
+    find_live(f);
+    find_latest(f);
+    find_updates(f);
+    find_next_boot(f);
+    find_localtime(f);
+    find_etc_localtime(f);
+    find_record(f);
+    find_legacy(f);
+    tree.rewind(r.now);
+}
