@@ -268,7 +268,9 @@ find_system_version(finder& f)
                         " holds a number too large for a version: not even the system data can "
                         "be linked.")
             : f.add("warning", "system-version", version,
-                    "The system data's version is \"" + f.r.system.version +
+                    (first_word(tree, version).empty() ? version + " holds no version, so t"
+                                                       : std::string("T")) +
+                        "he system data's version is \"" + f.r.system.version +
                         "\", which is not a version: every boot warns about it, the system data "
                         "orders below every update, and the data in use is never found older "
                         "than it.");
@@ -479,16 +481,21 @@ find_next_boot(finder& f)
     const velm_run& next = r.next_boot;
     velm_commands system = {rm(velm_path::zoneinfo_link), rm(velm_path::latest_link)};
     if (next.exit_status != 0) {
-        // The entry it could not change, and why, from its last words.
+        // The entry it could not change, and why, from its words: the
+        // first refusal of the kernel, or else the last failure.
         std::string failed, why;
+        auto refusal = [](const std::string& text) {
+            return text == strerror(EROFS) || text == strerror(EACCES) || text == strerror(EPERM);
+        };
         for (const std::string& message : next.messages) {
             for (const char* call : {"create_symlink: from ", "remove: could not remove "}) {
                 std::string start = std::string("tzlinks: ") + call;
-                if (has_prefix(message, start.c_str())) {
-                    failed = message.substr(start.size());
-                    failed = failed.substr(0, failed.find(' '));
-                    why = message.substr(message.rfind(": ") + 2);
-                }
+                if (!has_prefix(message, start.c_str()) || refusal(why))
+                    continue;
+                size_t end = message.rfind(": ");
+                failed = message.substr(start.size(), end - start.size());
+                failed = failed.substr(0, failed.find(" to "));
+                why = message.substr(end + 2);
             }
         }
         velm_finding& found = f.add(
@@ -497,7 +504,7 @@ find_next_boot(finder& f)
                 (failed.empty() ? std::string() : " (" + failed + ": " + why + ")") +
                 ": it exits with status " + std::to_string(next.exit_status) +
                 " and leaves localtime as it is.");
-        if (why == strerror(EROFS) || why == strerror(EACCES) || why == strerror(EPERM))
+        if (refusal(why))
             found.manual = "write access for root to " + parent_of(failed) +
                            (why == strerror(EROFS) ? ", on a file system mounted read-write" : "");
         else if (!failed.empty())

@@ -191,11 +191,15 @@ same(const velm_finding& a, const velm_finding& b)
 }
 
 // The device after commands and one boot, as the report of it would say.
-static velm_report
+// The device after commands and one boot, as the report of it would say;
+// none when a command fails, which stops a script run with sh -e.
+static std::optional<velm_report>
 repaired(velm_simulation& tree, const velm_commands& commands)
 {
-    for (const velm_command& command : commands)
-        tree.apply(command);
+    for (const velm_command& command : commands) {
+        if (!tree.apply(command))
+            return std::nullopt;
+    }
     simulate_boot(tree);
     return survey(tree, "");
 }
@@ -204,9 +208,11 @@ repaired(velm_simulation& tree, const velm_commands& commands)
 // clear, and no error that was not there before.
 static bool
 cleared(const velm_report& before, const std::vector<const velm_finding*>& targets,
-        const velm_report& after)
+        const std::optional<velm_report>& after)
 {
-    for (const velm_finding& found : after.findings) {
+    if (!after)
+        return false;
+    for (const velm_finding& found : after->findings) {
         for (const velm_finding* target : targets) {
             if (same(found, *target))
                 return false;
@@ -231,13 +237,17 @@ check_repairs(velm_simulation& tree, velm_report& r)
     std::vector<const velm_finding*> targets;
     for (velm_finding& finding : r.findings) {
         // A finding that follows from one before it is cleared by that
-        // one's repair, perhaps with its own.
-        std::vector<velm_commands> tries = finding.tries;
-        for (const velm_commands& own : finding.tries) {
-            if (all.empty())
-                break;
-            tries.push_back(all);
-            tries.back().insert(tries.back().end(), own.begin(), own.end());
+        // one's repair, perhaps with its own; or by all of theirs.
+        std::vector<velm_commands> tries = finding.tries, earlier;
+        for (const velm_finding* target : targets)
+            earlier.push_back(*target->commands);
+        if (targets.size() > 1)
+            earlier.push_back(all);
+        for (const velm_commands& first : earlier) {
+            for (const velm_commands& own : finding.tries) {
+                tries.push_back(first);
+                tries.back().insert(tries.back().end(), own.begin(), own.end());
+            }
         }
         for (const velm_commands& commands : tries) {
             bool works = cleared(r, {&finding}, repaired(tree, commands));
@@ -256,13 +266,13 @@ check_repairs(velm_simulation& tree, velm_report& r)
         all.insert(all.end(), finding.commands->begin(), finding.commands->end());
         targets.push_back(&finding);
     }
-    velm_report after = repaired(tree, all);
+    std::optional<velm_report> after = repaired(tree, all);
     tree.rewind(now);
     bool together = cleared(r, targets, after);
     for (velm_finding& finding : r.findings)
         finding.verified = finding.verified && together;
-    r.repaired_health = after.health;
-    for (const velm_finding& finding : after.findings)
+    r.repaired_health = after ? after->health : "unknown";
+    for (const velm_finding& finding : after ? after->findings : r.findings)
         r.repaired_findings.push_back(finding.id);
 }
 

@@ -466,11 +466,20 @@ anonymous_file(const std::string& text)
 
 // A descriptor that only describes an entry (fstat works, nothing else):
 // what the boot gets for a FIFO, a device or a file it will not touch,
-// without opening any of them.
+// without opening any of them. A device on a file system mounted without
+// devices cannot be opened at all.
 static int
 description_of(const velm_entry& entry)
 {
-    return openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+    int fd = openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+    struct statvfs fs = {};
+    if (fd >= 0 && entry.kind == velm_entry::device && fstatvfs(fd, &fs) == 0 &&
+        (fs.f_flag & ST_NODEV) != 0) {
+        (void)close(fd);
+        errno = EACCES;
+        return -1;
+    }
+    return fd;
 }
 
 int
@@ -550,7 +559,7 @@ velm_simulation::open(const char* path, int flags, mode_t /*mode*/)
     return fd;
 }
 
-void
+bool
 velm_simulation::apply(const velm_command& command)
 {
     int saved = errno;
@@ -559,6 +568,15 @@ velm_simulation::apply(const velm_command& command)
                                command.verb == velm_command::copy ||
                                    command.verb == velm_command::move,
                                canonical);
+    // Root may change anything but what the kernel refuses to everyone.
+    auto refused = [this](const std::string& directory) {
+        int error = may_change_in(directory);
+        return error == EROFS || error == EPERM;
+    };
+    bool changes_first = command.verb != velm_command::make_dirs &&
+                         command.verb != velm_command::copy && command.verb != velm_command::write;
+    if (changes_first && refused(parent_of(canonical)))
+        return false;
     velm_entry made;
     made.fresh = true;
     switch (command.verb) {
@@ -569,7 +587,7 @@ velm_simulation::apply(const velm_command& command)
         break;
     case velm_command::remove:
         if (entry.kind == velm_entry::directory)
-            return;
+            return false;
         break;
     case velm_command::remove_tree:
         break;
@@ -578,16 +596,20 @@ velm_simulation::apply(const velm_command& command)
         for (size_t slash = 1; slash != std::string::npos;) {
             slash = command.first.find('/', slash + 1);
             std::string above;
-            if (resolve(command.first.substr(0, slash), true, above).kind == velm_entry::absent)
-                changed[above] = made;
+            if (resolve(command.first.substr(0, slash), true, above).kind != velm_entry::absent)
+                continue;
+            if (refused(parent_of(above)))
+                return false;
+            changed[above] = made;
         }
         errno = saved;
-        return;
+        return true;
     case velm_command::copy:
     case velm_command::move:
-        if (entry.kind != velm_entry::directory ||
-            look(command.second).kind != velm_entry::absent)
-            return;
+        if (look(command.second).kind != velm_entry::absent)
+            return true; // test -e SECOND || ...
+        if (entry.kind != velm_entry::directory)
+            return false;
         made = entry, made.text.clear();
         if (command.verb == velm_command::move)
             changed[canonical] = velm_entry();
@@ -600,9 +622,11 @@ velm_simulation::apply(const velm_command& command)
         made.kind = velm_entry::file, made.text = command.first + "\n";
         break;
     }
-    if (entry.error == 0)
-        changed[canonical] = made;
+    if (entry.error != 0 || refused(parent_of(canonical)))
+        return false;
+    changed[canonical] = made;
     errno = saved;
+    return true;
 }
 
 void

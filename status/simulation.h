@@ -68,8 +68,10 @@ class velm_simulation final : public velm_system_calls {
     std::optional<std::string> read(const std::string& path, size_t limit);
     // The names in the directory at path, as a listing shows them now.
     std::vector<std::string> names(const std::string& path);
-    // Makes a change as a shell command would.
-    void apply(const velm_command& command);
+    // Makes a change as a shell command run by root would; false when the
+    // command would fail (a read-only file system, an immutable directory,
+    // nothing to move), and nothing changes then.
+    bool apply(const velm_command& command);
     // Makes path a copy of the directory below outside, which lies outside
     // the root (an update about to be staged).
     void graft(const std::string& path, int outside);

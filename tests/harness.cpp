@@ -14,6 +14,13 @@
 #include <unistd.h>
 
 static const char* runner = getenv("TZLINKS_RUNNER");
+static std::string without; // setpriv and its options, or nothing
+
+void
+drop_capabilities(const std::string& drop)
+{
+    without = drop.empty() ? "" : "setpriv --inh-caps=" + drop + " --bounding-set=" + drop + " ";
+}
 static const std::string live_dir = "/var/db/timezone/";
 
 // A new file system goes over whatever an earlier test left there; but only
@@ -39,14 +46,14 @@ build_tree(const std::string& commands)
 std::string
 program(const std::string& path, const std::string& args)
 {
-    return "exec " + std::string(runner ? runner : "") + " " + path + " " + args;
+    return "exec " + without + (runner ? runner : "") + " " + path + " " + args;
 }
 
 std::string
 tzlinks(const std::string& inject)
 {
     std::string strace = "strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=";
-    return "exec " + (inject.empty() ? "" : strace + inject) + " " + (runner ? runner : "") +
+    return "exec " + without + (inject.empty() ? "" : strace + inject) + " " + (runner ? runner : "") +
            " " TZLINKS_BINARY;
 }
 
@@ -136,8 +143,16 @@ parse(const std::string& line)
         fields.push_back(field.substr(std::min(field.find_first_not_of(' '), field.size())));
     row r;
     std::istringstream head(fields.at(0)), words(fields.at(2));
-    head >> r.name >> r.inject;
-    r.inject = r.inject.substr(r.inject.find('=') + 1), r.tree = fields.at(1);
+    head >> r.name;
+    for (std::string option; head >> option;) {
+        if (option.compare(0, 7, "inject=") == 0)
+            r.inject = option.substr(7);
+        else if (option.compare(0, 5, "caps=") == 0)
+            r.caps = option.substr(5);
+        else
+            r.local = option == "local";
+    }
+    r.tree = fields.at(1);
     for (std::string word; words >> word;) {
         if (word.compare(0, 5, "exit=") == 0)
             r.exit = std::stoi(word.substr(5));

@@ -25,8 +25,10 @@ struct outcome {
 // $TZLINKS_RUNNER).
 outcome run(const std::string& command);
 // The command that starts a program of the project in place of the shell,
-// through $TZLINKS_RUNNER (an emulator, or valgrind), with arguments.
+// through $TZLINKS_RUNNER (an emulator, or valgrind), with arguments; both
+// programs without the capabilities drop names (setpriv's list), if any.
 std::string program(const std::string& path, const std::string& args = "");
+void drop_capabilities(const std::string& drop);
 // The same for tzlinks, under strace failing calls as inject says (its
 // inject= expression) when that is not empty; leak checks cannot run under
 // ptrace.
@@ -38,9 +40,10 @@ std::string tzlinks(const std::string& inject = "");
 std::map<std::string, std::string> snapshot(bool with_times = false);
 
 struct row {
-    std::string name, inject, tree, health, err; // err: as warn(3) writes it
+    std::string name, inject, caps, tree, health, err; // err: as warn(3) writes it
     std::vector<std::string> changes;
     int exit = 0;
+    bool local = false; // a tree no copy can stand for (its mounts)
 };
 std::vector<row> load_rows();
 // The fault and power-cut runs of a row, from its tree kept at pristine.

@@ -27,6 +27,7 @@ class tool : public ::testing::TestWithParam<row> {};
 TEST_P(tool, row)
 {
     const row& r = GetParam();
+    drop_capabilities(r.caps);
     ASSERT_TRUE(fresh_tree());
     ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree)) << r.tree;
     auto before = snapshot(true), plain_before = snapshot();
@@ -38,14 +39,17 @@ TEST_P(tool, row)
                   between(report, "\"health\":\"", "\"") + (ids.empty() ? "" : ":" + ids),
               r.health);
     std::string copy =
-        run("d=$(mktemp -d) && cd / && cp -a --parents var usr/share etc $d && printf $d").out;
+        run("d=$(mktemp -d) && cd / && { cp -a --parents var usr/share etc $d; printf $d; }").out;
+    ASSERT_FALSE(copy.empty());
     outcome through_root = run(program(TZLINKS_STATUS_BINARY, "--json --root " + copy));
     // Its commands name the copy's paths; nothing else may differ.
     for (size_t at; (at = through_root.out.find(copy)) != std::string::npos;)
         through_root.out.erase(at, copy.size());
-    EXPECT_EQ(through_root.out, report) << "the report differs through --root";
     char health_ = r.health.at(r.health.find(':') + 1); // h, d or b
-    EXPECT_EQ(through_root.status, health_ == 'h' ? 0 : health_ == 'd' ? 1 : 2);
+    if (!r.local) {
+        EXPECT_EQ(through_root.out, report) << "the report differs through --root";
+        EXPECT_EQ(through_root.status, health_ == 'h' ? 0 : health_ == 'd' ? 1 : 2);
+    }
 
     outcome run_ = run(tzlinks(r.inject));
     EXPECT_EQ(run_.out + run_.err, r.err); // nothing on standard output
@@ -65,7 +69,7 @@ TEST_P(tool, row)
                       ",\"exit_status\":" + std::to_string(run_.status) + ",\"messages\":[" +
                       messages + "]");
     }
-    if (getenv("TZLINKS_FAULTS") != nullptr && r.inject.empty())
+    if (getenv("TZLINKS_FAULTS") != nullptr && r.inject.empty() && !r.local)
         try_faults(copy + "/var");
 
     // The repairs, on the tree as it was: every finding's commands, then one
@@ -74,6 +78,8 @@ TEST_P(tool, row)
     EXPECT_FALSE(std::regex_search(report, std::regex(R"("commands":\[[^\]]*\],"manual":)"
                                                       R"((null|"[^"]*"),"verified":false)")))
         << "a repair that the simulation does not show to work";
+    if (r.local)
+        return (void)run("rm -rf " + copy);
     run("rm -rf /var/* /usr/share/* /etc/* && cd " + copy +
         " && cp -a var/. /var && cp -a usr/share/. /usr/share && cp -a etc/. /etc");
     std::ofstream(copy + ".sh") << run(program(TZLINKS_STATUS_BINARY, "--commands")).out;
