@@ -235,8 +235,8 @@ find_unread(finder& f, const std::map<std::string, int>& unread)
     for (const auto& [path, error] : unread) {
         if (error == EFBIG) {
             f.add("note", "read-in-part", path,
-                  path + " is longer than 64 KiB: only its start was read, and the prediction "
-                         "takes it as that long.");
+                  path + " is longer than this report reads: only its start was read, and the "
+                         "prediction takes it as that long.");
             continue;
         }
         // Only a loop of links or an over-long name stops root: what to do

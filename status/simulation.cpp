@@ -164,10 +164,13 @@ velm_simulation::read(const std::string& path, size_t limit)
     velm_entry entry = resolve(path, true, canonical);
     std::optional<std::string> text;
     int fd = entry.kind == velm_entry::file ? open_for_reading(canonical, entry, 0) : -1;
+    struct stat st;
     if (fd >= 0) {
         text.emplace(limit, '\0');
         ssize_t n = pread(fd, text->data(), limit, 0);
         text->resize(static_cast<size_t>(std::max(n, ssize_t(0))));
+        if (fstat(fd, &st) == 0 && st.st_size > static_cast<off_t>(limit) && limit > 64)
+            trouble.emplace(canonical, EFBIG);
         (void)close(fd);
     }
     errno = saved;

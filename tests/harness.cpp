@@ -9,6 +9,7 @@
 #include <sstream>
 #include <sys/mman.h>
 #include <sys/mount.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -79,9 +80,15 @@ run(const std::string& command)
         _exit(127);
     }
     int status = 0;
-    waitpid(child, &status, 0);
+    struct rusage usage = {};
+    timespec start = {}, end = {};
+    clock_gettime(CLOCK_MONOTONIC, &start);
+    wait4(child, &status, 0, &usage);
+    clock_gettime(CLOCK_MONOTONIC, &end);
     status = WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
-    return {status, contents(out), contents(err)};
+    return {status, contents(out), contents(err), usage.ru_maxrss,
+            static_cast<double>(end.tv_sec - start.tv_sec) +
+                static_cast<double>(end.tv_nsec - start.tv_nsec) / 1e9};
 }
 
 std::map<std::string, std::string>

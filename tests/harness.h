@@ -20,6 +20,8 @@ bool build_tree(const std::string& commands);
 struct outcome {
     int status; // exit status, or 128 + the signal that ended it
     std::string out, err;
+    long max_rss;   // KiB, at most, of the program
+    double seconds; // of wall time
 };
 // Runs a shell command, killed after a second (a minute under
 // $TZLINKS_RUNNER).

@@ -163,9 +163,38 @@ TEST(status, command_line)
                             system + ",\"compatible\":true,\"older\":false},\"system\":{" + system +
                             "},\"latest\":null,"),
               std::string::npos);
+    // As another user than the boot's, it says what it could not ask.
+    EXPECT_NE(run("exec unshare -U --map-user=1000 --map-group=1000 sh -c '" +
+                  program(TZLINKS_STATUS_BINARY) + "'")
+                  .out.find("note unverified: tzlinks-status runs as user 1000, not as root"),
+              std::string::npos);
     outcome full = run(program(TZLINKS_STATUS_BINARY, ">/dev/full"));
     EXPECT_EQ(std::to_string(full.status) + full.err,
               "74tzlinks-status: cannot write the report: No space left on device\n");
+}
+
+// Whatever a tree holds, tzlinks keeps no update's +VERSION, and
+// tzlinks-status reads no file whole, finishes in a second and writes every
+// text longer than 8 KiB cut. (Not under an emulator, valgrind or a
+// sanitizer, which change what is measured.)
+TEST(status, bounded)
+{
+    if (getenv("TZLINKS_RUNNER") != nullptr || TZLINKS_SANITIZED)
+        GTEST_SKIP() << "measured only in a plain build";
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; live_update 2024a; latest 2024a"));
+    long small = run(tzlinks()).max_rss;
+    ASSERT_TRUE(build_tree("repeat 67108864 a >$tz/tz/2024a/zoneinfo/+VERSION"));
+    EXPECT_LT(run(tzlinks()).max_rss - small, 1024) << "KiB more for a 64 MiB +VERSION";
+    ASSERT_TRUE(build_tree("repeat 67108864 x >/usr/share/zoneinfo.default/+VERSION; "
+                           "repeat 67108864 b >$tz/TZVersionDiffRecord"));
+    for (const char* form : {"", "--json"}) {
+        outcome o = run(program(TZLINKS_STATUS_BINARY, form));
+        EXPECT_LT(o.max_rss, 16384) << form;
+        EXPECT_LT(o.seconds, 1.0) << form;
+        EXPECT_LT(o.out.size(), 256U * 1024) << form;
+        EXPECT_NE(o.out.find("more bytes]"), std::string::npos) << form;
+    }
 }
 
 // The README's example of a report is the report of the demo's device.
