@@ -9,7 +9,6 @@
 // A file that cannot be opened or holds no word leaves target unchanged;
 // nothing is reported. Reading stops once the word is longer than keep
 // bytes, and so does the word: a word nobody uses need not be held whole.
-void read_first_word(const std::string& path, std::string& target,
-                     size_t keep = std::string::npos);
+void read_first_word(const std::string& path, std::string& target, size_t keep = std::string::npos);
 
 #endif

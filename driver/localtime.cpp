@@ -24,7 +24,8 @@ keep_or_rewrite_localtime()
             return true;
         if (!has_prefix(target, legacy_prefix))
             return false;
-        std::string corrected = std::string(live_prefix) + target.substr(sizeof velm_path::legacy_zoneinfo - 1);
+        std::string corrected =
+            std::string(live_prefix) + target.substr(sizeof velm_path::legacy_zoneinfo - 1);
         warn("Correcting localtime link to %s", corrected.c_str());
         if (!velm_fs::path_exists(corrected))
             return false;

@@ -60,8 +60,8 @@ decide()
         latest.activate();
         write_version_diff_record(in_use->get_version_string(), latest.get_version_string());
     } else {
-        warn("%s: %s vs. %s", velm_says::refused,
-             latest.get_version_string().c_str(), current.get_version_string().c_str());
+        warn("%s: %s vs. %s", velm_says::refused, latest.get_version_string().c_str(),
+             current.get_version_string().c_str());
     }
 }
 

@@ -22,7 +22,7 @@ const char spaces[] = " \t\n\v\f\r";
 velm_command
 ln(const std::string& target, const std::string& path)
 {
-    return {velm_command::link, target, path};
+    return {velm_command::symlink_to, target, path};
 }
 
 // Removes whatever stands at path: rm -f, or rm -rf for a directory. The
@@ -33,7 +33,7 @@ velm_command
 rm(const std::string& path)
 {
     bool tree = before_repair->look(path).kind == velm_entry::directory;
-    return {tree ? velm_command::remove_tree : velm_command::remove, path, ""};
+    return {tree ? velm_command::remove_tree : velm_command::remove_entry, path, ""};
 }
 
 // What makes path a link to target: ln -sfn replaces anything but a
@@ -52,7 +52,8 @@ relink(const std::string& target, const std::string& path)
 velm_commands
 clear(const std::string& path)
 {
-    return before_repair->look(path).kind == velm_entry::absent ? velm_commands() : velm_commands{rm(path)};
+    return before_repair->look(path).kind == velm_entry::absent ? velm_commands()
+                                                                : velm_commands{rm(path)};
 }
 
 std::string
@@ -105,7 +106,7 @@ what_it_does(const velm_run& run)
     if (run.action == "fail")
         return "fails";
     return run.zoneinfo == velm_path::system_zoneinfo ? "links the system data"
-                                                     : "keeps the data in use";
+                                                      : "keeps the data in use";
 }
 
 // A report's findings are made while the simulation stands as the tree is
@@ -165,8 +166,8 @@ release_in(velm_simulation& tree, const std::string& directory)
     static const char mark[] = "# version ";
     if (!has_prefix(text, mark))
         return "";
-    std::string word = text.substr(sizeof mark - 1, text.find_first_of(spaces, sizeof mark - 1) -
-                                                        (sizeof mark - 1));
+    std::string word = text.substr(sizeof mark - 1,
+                                   text.find_first_of(spaces, sizeof mark - 1) - (sizeof mark - 1));
     return velm_version_match_text(word).size == 5 ? word : "";
 }
 
@@ -193,11 +194,11 @@ find_places(finder& f)
                   "takes it that root may.");
     velm_entry directory = tree.look(velm_path::link_directory, true);
     if (directory.kind != velm_entry::directory) {
-        velm_finding& no = f.add(
-            "error", "no-timezone-directory", velm_path::link_directory,
-            std::string(velm_path::link_directory) +
-                (directory.kind == velm_entry::absent ? " is missing" : " is no directory") +
-                ": the boot cannot link any data, not even the system's.");
+        velm_finding& no =
+            f.add("error", "no-timezone-directory", velm_path::link_directory,
+                  std::string(velm_path::link_directory) +
+                      (directory.kind == velm_entry::absent ? " is missing" : " is no directory") +
+                      ": the boot cannot link any data, not even the system's.");
         velm_commands make = clear(velm_path::link_directory);
         make.push_back({velm_command::make_dirs, velm_path::updates, ""});
         no.tries = {make};
@@ -207,23 +208,24 @@ find_places(finder& f)
     bool instead = kind(tree, velm_path::legacy_zoneinfo) == velm_entry::directory &&
                    tz_database(tree, velm_path::legacy_zoneinfo);
     std::string release = release_in(tree, velm_path::legacy_zoneinfo);
-    velm_finding& no = f.add(
-        "error", "no-system-data", velm_path::system_zoneinfo,
-        std::string(velm_path::system_zoneinfo) +
-            " is no directory: there is no system tz database to fall back on" +
-            (instead ? std::string("; ") + velm_path::legacy_zoneinfo + " holds one" +
-                           (release.empty() ? "" : " (release " + release + ")")
-                     : std::string(", nor in ") + velm_path::legacy_zoneinfo) +
-            ".");
+    velm_finding& no =
+        f.add("error", "no-system-data", velm_path::system_zoneinfo,
+              std::string(velm_path::system_zoneinfo) +
+                  " is no directory: there is no system tz database to fall back on" +
+                  (instead ? std::string("; ") + velm_path::legacy_zoneinfo + " holds one" +
+                                 (release.empty() ? "" : " (release " + release + ")")
+                           : std::string(", nor in ") + velm_path::legacy_zoneinfo) +
+                  ".");
     no.manual = std::string("a compiled tz database at ") + velm_path::system_zoneinfo +
                 ", with its release, such as 2025b, as the first word of its +VERSION";
     std::string version = std::string(velm_path::system_zoneinfo) + "/+VERSION";
     if (instead) {
         velm_commands copy = clear(velm_path::system_zoneinfo);
-        copy.push_back({velm_command::copy, velm_path::legacy_zoneinfo, velm_path::system_zoneinfo});
+        copy.push_back(
+            {velm_command::copy_tree, velm_path::legacy_zoneinfo, velm_path::system_zoneinfo});
         if (!release.empty() &&
             first_word(tree, velm_path::legacy_zoneinfo + std::string("/+VERSION")).empty())
-            copy.push_back({velm_command::write, release, version});
+            copy.push_back({velm_command::write_word, release, version});
         no.tries = {copy};
     }
 }
@@ -279,9 +281,9 @@ find_system_version(finder& f)
     std::string release = release_in(tree, velm_path::system_zoneinfo);
     if (release.empty())
         return;
-    velm_commands write = tree.look(version).kind == velm_entry::file ? velm_commands()
-                                                                      : clear(version);
-    write.push_back({velm_command::write, release, version});
+    velm_commands write =
+        tree.look(version).kind == velm_entry::file ? velm_commands() : clear(version);
+    write.push_back({velm_command::write_word, release, version});
     found.tries = {write};
 }
 
@@ -308,15 +310,14 @@ find_live(finder& f)
     }
     if (!said(r.next_boot, velm_says::incompatible))
         return;
-    std::string why =
-        !r.live.present ? "has a version number too large"
-        : !r.live.compatible
-            ? "has ICU schema " + schema(r.live.icu_schema) + ", the system data " +
-                  schema(r.system.icu_schema)
-        : !r.live.version_understood
-            ? "is named \"" + r.live.version + "\", which is not a version and counts as older "
-                                               "than the system data"
-            : "is older than the system data, " + r.system.version;
+    std::string why = !r.live.present      ? "has a version number too large"
+                      : !r.live.compatible ? "has ICU schema " + schema(r.live.icu_schema) +
+                                                 ", the system data " + schema(r.system.icu_schema)
+                      : !r.live.version_understood
+                          ? "is named \"" + r.live.version +
+                                "\", which is not a version and counts as older "
+                                "than the system data"
+                          : "is older than the system data, " + r.system.version;
     f.add("warning", "live-rejected", velm_path::zoneinfo_link,
           "The data in use, " + (r.live.present ? r.live.version : r.live.root) + ", " + why +
               ": the next boot sets it aside and " + what_it_does(r.next_boot) + ".")
@@ -372,11 +373,10 @@ find_latest(finder& f)
                                 : unlink;
     if (target.back() == '/') {
         f.add("warning", "latest-trailing-slash", latest.root,
-              "tz_latest names \"" + target +
-                  "\", with a trailing slash: its version is then \"" + latest.version +
-                  "\", which is not a version, and no boot adopts it.")
-            .tries = {{ln(target.substr(0, target.find_last_not_of('/') + 1),
-                          velm_path::latest_link)}};
+              "tz_latest names \"" + target + "\", with a trailing slash: its version is then \"" +
+                  latest.version + "\", which is not a version, and no boot adopts it.")
+            .tries = {
+            {ln(target.substr(0, target.find_last_not_of('/') + 1), velm_path::latest_link)}};
     } else if (kind(tree, latest.root, true) != velm_entry::directory) {
         f.add("warning", "latest-missing", latest.root,
               "tz_latest names " + latest.root + ", which does not exist: no boot adopts it.")
@@ -391,8 +391,8 @@ find_latest(finder& f)
                        (word.empty() ? "2025b" : word) + ".1.0";
         if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
             kind(tree, renamed) == velm_entry::absent)
-            found.tries = {{{velm_command::move, latest.root, renamed},
-                            ln(renamed, velm_path::latest_link)}};
+            found.tries = {
+                {{velm_command::move_tree, latest.root, renamed}, ln(renamed, velm_path::latest_link)}};
     } else if (!latest.compatible) {
         std::string want = r.system.icu_schema;
         std::string data = latest.root + "/icutz/icutz" + want + ".dat";
@@ -440,8 +440,8 @@ find_updates(finder& f)
 {
     const velm_report& r = f.r;
     std::vector<std::string> named;
-    for (const velm_text& link : {r.zoneinfo, r.icutz, r.tz_latest, r.next_boot.zoneinfo,
-                                  r.next_boot.icutz})
+    for (const velm_text& link :
+         {r.zoneinfo, r.icutz, r.tz_latest, r.next_boot.zoneinfo, r.next_boot.icutz})
         named.push_back(update_of(link));
     velm_simulation& tree = f.now();
     for (const std::string& name : tree.names(velm_path::updates)) {
@@ -457,16 +457,18 @@ find_updates(finder& f)
         if (match.size == 5 && !word.empty() && word != match.group[1] + match.group[2])
             f.add("warning", "version-mismatch", root,
                   root + " holds the tz database " + word +
-                      " (the first word of its +VERSION), though its name says " +
-                      match.group[1] + match.group[2] + ": the boot orders it by its name.")
-                .manual = "the tz database of release " + match.group[1] + match.group[2] +
-                          " in " + root + "/zoneinfo, or a directory named for release " + word;
+                      " (the first word of its +VERSION), though its name says " + match.group[1] +
+                      match.group[2] + ": the boot orders it by its name.")
+                .manual = "the tz database of release " + match.group[1] + match.group[2] + " in " +
+                          root + "/zoneinfo, or a directory named for release " + word;
         std::string data = icu_data_in(tree, root + "/icutz");
         std::string head = data.empty() ? "" : tree.read(data, 4).value_or("");
         if (!data.empty() && (head.size() < 4 || head.compare(2, 2, "\xda\x27") != 0))
             f.add("warning", "icu-data-bad", data,
-                  data + (head.empty() ? " is empty" : " is no ICU data (it lacks the header "
-                                                       "ICU's data files begin with)") +
+                  data +
+                      (head.empty() ? " is empty"
+                                    : " is no ICU data (it lacks the header "
+                                      "ICU's data files begin with)") +
                       ": the boot goes by its name alone and uses it, and ICU's readers then "
                       "fail.")
                 .manual = "ICU data built by ICU's tools as " + data;
@@ -494,16 +496,16 @@ find_next_boot(finder& f)
                     continue;
                 size_t end = message.rfind(": ");
                 failed = message.substr(start.size(), end - start.size());
-                failed = failed.substr(0, failed.find(" to "));
+                failed.resize(std::min(failed.find(" to "), failed.size()));
                 why = message.substr(end + 2);
             }
         }
-        velm_finding& found = f.add(
-            "error", "next-boot-fails", "",
-            "The next boot cannot even link the system data" +
-                (failed.empty() ? std::string() : " (" + failed + ": " + why + ")") +
-                ": it exits with status " + std::to_string(next.exit_status) +
-                " and leaves localtime as it is.");
+        velm_finding& found =
+            f.add("error", "next-boot-fails", "",
+                  "The next boot cannot even link the system data" +
+                      (failed.empty() ? std::string() : " (" + failed + ": " + why + ")") +
+                      ": it exits with status " + std::to_string(next.exit_status) +
+                      " and leaves localtime as it is.");
         if (refusal(why))
             found.manual = "write access for root to " + parent_of(failed) +
                            (why == strerror(EROFS) ? ", on a file system mounted read-write" : "");
@@ -523,8 +525,9 @@ find_next_boot(finder& f)
     if (!update.empty() && next.icutz != update + "/icutz")
         f.add("warning", icutz ? "icutz-stale" : "icutz-missing", velm_path::icutz_link,
               "icutz names " + quoted(next.icutz) + ", not the ICU data of the update in use, " +
-                  update + ": ICU's readers use other data than the tz database, and no boot "
-                           "changes that.")
+                  update +
+                  ": ICU's readers use other data than the tz database, and no boot "
+                  "changes that.")
             .tries = {relink(update + "/icutz", velm_path::icutz_link)};
     else if (update.empty() && icutz)
         f.add("warning", "icutz-with-system", velm_path::icutz_link,
@@ -541,9 +544,8 @@ zone_meant(velm_simulation& tree, const velm_text& target)
 {
     if (!target)
         return "";
-    std::string at = has_prefix(*target, "/")
-                         ? *target
-                         : std::string(velm_path::link_directory) + "/" + *target;
+    std::string at =
+        has_prefix(*target, "/") ? *target : std::string(velm_path::link_directory) + "/" + *target;
     for (const std::string& tree_of : {std::string(velm_path::zoneinfo_link),
                                        std::string(velm_path::legacy_zoneinfo) + ".default",
                                        std::string(velm_path::legacy_zoneinfo)}) {
@@ -569,20 +571,23 @@ find_localtime(finder& f)
     std::string manual = "a link " + std::string(velm_path::localtime_link) + " to " + live +
                          "<zone>, naming a zone file of the data in use";
     if (!usable_now || !usable_next) {
-        velm_finding& found = f.add(
-            "error", "localtime-unusable", velm_path::localtime_link,
-            "localtime names " + quoted(r.localtime) +
-                (usable_now ? ", a zone file" : ", which is no link to a zone file") +
-                "; the next boot leaves " + quoted(next.localtime) +
-                (usable_next ? "." : (usable_now ? ", which leads to none." : ", which is none either.")));
+        velm_finding& found =
+            f.add("error", "localtime-unusable", velm_path::localtime_link,
+                  "localtime names " + quoted(r.localtime) +
+                      (usable_now ? ", a zone file" : ", which is no link to a zone file") +
+                      "; the next boot leaves " + quoted(next.localtime) +
+                      (usable_next
+                           ? "."
+                           : (usable_now ? ", which leads to none." : ", which is none either.")));
         found.manual = manual;
         found.tries = {{}};
         if (!zone.empty())
             found.tries.push_back(to_zone);
         found.tries.push_back({rm(velm_path::localtime_link)});
     } else if (next.localtime != r.localtime && next.localtime == velm_path::default_localtime) {
-        bool legacy = r.localtime &&
-                      has_prefix(*r.localtime, (velm_path::system_zoneinfo + std::string("/")).c_str());
+        bool legacy =
+            r.localtime &&
+            has_prefix(*r.localtime, (velm_path::system_zoneinfo + std::string("/")).c_str());
         velm_finding& found =
             f.add("warning", legacy ? "localtime-legacy-default" : "localtime-reset",
                   velm_path::localtime_link,

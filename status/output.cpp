@@ -54,7 +54,8 @@ static bool
 control(const std::string& text, size_t i, size_t n)
 {
     auto c = static_cast<unsigned char>(text[i]);
-    return c < 0x20 || c == 0x7f || (n == 2 && c == 0xc2 && static_cast<unsigned char>(text[i + 1]) < 0xa0);
+    return c < 0x20 || c == 0x7f ||
+           (n == 2 && c == 0xc2 && static_cast<unsigned char>(text[i + 1]) < 0xa0);
 }
 
 // Valid UTF-8 as it is; a control character, or a byte that is not part of
@@ -157,7 +158,7 @@ json_report(const velm_report& r)
            ",\"record\":" + json(next.record) +
            ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
            "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) +
-           ",\"after_repair\":{\"health\":" + json(r.repaired_health) + ",\"findings\":[" +
+           R"(,"after_repair":{"health":)" + json(r.repaired_health) + ",\"findings\":[" +
            remaining + "]}}\n";
 }
 

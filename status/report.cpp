@@ -78,8 +78,8 @@ simulate_boot(velm_simulation& tree)
     run.localtime = link_at(tree, velm_path::localtime_link);
     if (tree.written(velm_path::record))
         run.record = tree.look(velm_path::record).text;
-    run.action = run.exit_status != 0                       ? "fail"
-                 : run.zoneinfo == before                   ? "keep"
+    run.action = run.exit_status != 0                         ? "fail"
+                 : run.zoneinfo == before                     ? "keep"
                  : run.zoneinfo == velm_path::system_zoneinfo ? "reset"
                                                               : "adopt";
     return run;

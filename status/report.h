@@ -40,7 +40,7 @@ struct velm_finding {
     // when only a person can supply what manual names.
     std::optional<velm_commands> commands;
     std::string manual;
-    std::string subject; // the path it is about: with the id, what tells two apart
+    std::string subject;   // the path it is about: with the id, what tells two apart
     bool verified = false; // the commands, simulated, clear it and break nothing
     // Repairs to try, in order: the first that the simulation shows to work
     // becomes commands; when none does, manual (or the first, unverified).

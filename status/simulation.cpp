@@ -16,7 +16,7 @@
 // A file longer than this is read only that far: no first word the boot
 // reads, and no path, comes near it, and the report stays small whatever
 // the tree holds.
-static const size_t longest_read = 64 * 1024;
+static const size_t longest_read = size_t(64) * 1024;
 
 // A path below a directory descriptor ("" for the directory, else "/a/b")
 // as openat wants it.
@@ -184,10 +184,10 @@ velm_simulation::names(const std::string& path)
     std::string canonical;
     velm_entry entry = resolve(path, true, canonical);
     std::set<std::string> found;
-    int fd = entry.kind == velm_entry::directory && !entry.fresh
-                 ? openat(entry.base, relative(entry.real).c_str(),
-                          O_RDONLY | O_DIRECTORY | O_CLOEXEC)
-                 : -1;
+    int fd =
+        entry.kind == velm_entry::directory && !entry.fresh
+            ? openat(entry.base, relative(entry.real).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)
+            : -1;
     if (DIR* directory = fd < 0 ? nullptr : fdopendir(fd)) {
         // cppcheck-suppress readdirCalled ; one thread, one directory stream
         while (const struct dirent* child = readdir(directory))
@@ -259,9 +259,8 @@ velm_simulation::settle()
         velm_entry file;
         file.kind = velm_entry::file, file.fresh = true;
         file.text.resize(static_cast<size_t>(std::max(lseek(fd, 0, SEEK_END), off_t(0))));
-        file.text.resize(
-            static_cast<size_t>(std::max(pread(fd, file.text.data(), file.text.size(), 0),
-                                         ssize_t(0))));
+        file.text.resize(static_cast<size_t>(
+            std::max(pread(fd, file.text.data(), file.text.size(), 0), ssize_t(0))));
         changed[canonical] = file;
         writes.insert(canonical);
         (void)close(fd);
@@ -319,7 +318,7 @@ velm_simulation::may_write(const velm_entry& entry, int mode)
         return read_only && entry.kind == velm_entry::file ? EROFS : 0;
     }
     return faccessat(entry.base, path.c_str(), mode, AT_EACCESS | AT_SYMLINK_NOFOLLOW) == 0 ? 0
-                                                                                          : errno;
+                                                                                            : errno;
 }
 
 // An immutable or append-only file or directory cannot be removed.
@@ -524,8 +523,9 @@ velm_simulation::open_for_reading(const std::string& canonical, const velm_entry
     if (entry.kind == velm_entry::fifo || entry.kind == velm_entry::device)
         return description_of(entry);
     if (entry.fresh) // a new directory lists nothing the boot looks for
-        return entry.kind == velm_entry::file ? anonymous_file(entry.text)
-                                               : openat(root, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+        return entry.kind == velm_entry::file
+                   ? anonymous_file(entry.text)
+                   : openat(root, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     int fd = openat(entry.base, relative(entry.real).c_str(),
                     O_RDONLY | O_NONBLOCK | O_CLOEXEC | (flags & O_DIRECTORY));
     if (fd < 0) {
@@ -555,8 +555,8 @@ velm_simulation::open(const char* path, int flags, mode_t /*mode*/)
     bool writing = (flags & O_ACCMODE) != O_RDONLY;
     if (entry.kind == velm_entry::absent && !(writing && (flags & O_CREAT) != 0))
         return fail(ENOENT);
-    int fd = writing ? open_for_writing(canonical, entry)
-                     : open_for_reading(canonical, entry, flags);
+    int fd =
+        writing ? open_for_writing(canonical, entry) : open_for_reading(canonical, entry, flags);
     if (fd >= 0)
         errno = saved;
     return fd;
@@ -567,28 +567,27 @@ velm_simulation::apply(const velm_command& command)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(command.verb == velm_command::link ? command.second : command.first,
-                               command.verb == velm_command::copy ||
-                                   command.verb == velm_command::move,
-                               canonical);
+    velm_entry entry = resolve(
+        command.verb == velm_command::symlink_to ? command.second : command.first,
+        command.verb == velm_command::copy_tree || command.verb == velm_command::move_tree, canonical);
     // Root may change anything but what the kernel refuses to everyone.
     auto refused = [this](const std::string& directory) {
         int error = may_change_in(directory);
         return error == EROFS || error == EPERM;
     };
     bool changes_first = command.verb != velm_command::make_dirs &&
-                         command.verb != velm_command::copy && command.verb != velm_command::write;
+                         command.verb != velm_command::copy_tree && command.verb != velm_command::write_word;
     if (changes_first && refused(parent_of(canonical)))
         return false;
     velm_entry made;
     made.fresh = true;
     switch (command.verb) {
-    case velm_command::link:
+    case velm_command::symlink_to:
         if (entry.kind == velm_entry::directory) // ln puts the link inside
             canonical += command.first.substr(command.first.rfind('/'));
         made.kind = velm_entry::link, made.text = command.first;
         break;
-    case velm_command::remove:
+    case velm_command::remove_entry:
         if (entry.kind == velm_entry::directory)
             return false;
         break;
@@ -607,19 +606,19 @@ velm_simulation::apply(const velm_command& command)
         }
         errno = saved;
         return true;
-    case velm_command::copy:
-    case velm_command::move:
+    case velm_command::copy_tree:
+    case velm_command::move_tree:
         if (look(command.second).kind != velm_entry::absent)
             return true; // test -e SECOND || ...
         if (entry.kind != velm_entry::directory)
             return false;
         made = entry, made.text.clear();
-        if (command.verb == velm_command::move)
+        if (command.verb == velm_command::move_tree)
             changed[canonical] = velm_entry();
         canonical.clear();
         resolve(command.second, false, canonical);
         break;
-    case velm_command::write:
+    case velm_command::write_word:
         canonical.clear();
         resolve(command.second, true, canonical);
         made.kind = velm_entry::file, made.text = command.first + "\n";
@@ -646,7 +645,8 @@ velm_simulation::graft(const std::string& path, int outside)
 static std::string
 quote(const std::string& word)
 {
-    static const char plain[] = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_./+:=@%,-";
+    static const char plain[] =
+        "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_./+:=@%,-";
     if (!word.empty() && word.find_first_not_of(plain) == std::string::npos)
         return word;
     std::string out = "'";
@@ -660,19 +660,19 @@ shell_text(const velm_command& c, const std::string& root)
 {
     std::string first = quote(root + c.first), second = quote(root + c.second);
     switch (c.verb) {
-    case velm_command::link:
+    case velm_command::symlink_to:
         return "ln -sfn " + quote(c.first) + " " + second;
-    case velm_command::remove:
+    case velm_command::remove_entry:
         return "rm -f " + first;
     case velm_command::remove_tree:
         return "rm -rf " + first;
     case velm_command::make_dirs:
         return "mkdir -p " + first;
-    case velm_command::copy: // once: a second cp -a would copy into the copy
+    case velm_command::copy_tree: // once: a second cp -a would copy into the copy
         return "test -e " + second + " || cp -a " + first + " " + second;
-    case velm_command::move:
+    case velm_command::move_tree:
         return "test -e " + second + " || mv " + first + " " + second;
-    case velm_command::write:
+    case velm_command::write_word:
         return "printf '%s\\n' " + quote(c.first) + " >" + second;
     }
     return "";

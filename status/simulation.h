@@ -20,26 +20,26 @@
 // What stands at a path.
 struct velm_entry {
     enum kind_t { absent, link, file, directory, fifo, socket, device } kind = absent;
-    std::string text;       // a link's target; a file's content, when it is a new one
-    int error = 0;          // why the path could not be looked up, or 0
-    bool shared = false;    // a regular file with other names (hard links)
-    bool fresh = false;     // made by the simulation: nothing real stands behind it
-    mode_t mode = 0;        // permission bits
-    int base = -1;          // where it really lies: below this directory ...
-    std::string real;       // ... at this path ("" for base itself, else "/a/b")
+    std::string text;    // a link's target; a file's content, when it is a new one
+    int error = 0;       // why the path could not be looked up, or 0
+    bool shared = false; // a regular file with other names (hard links)
+    bool fresh = false;  // made by the simulation: nothing real stands behind it
+    mode_t mode = 0;     // permission bits
+    int base = -1;       // where it really lies: below this directory ...
+    std::string real;    // ... at this path ("" for base itself, else "/a/b")
 };
 
 // A change made as a person at the shell would make it. The shell text is
 // what a report shows; apply() makes the same change to a simulation.
 struct velm_command {
     enum verb_t {
-        link,        // ln -sfn FIRST SECOND
-        remove,      // rm -f FIRST
-        remove_tree, // rm -rf FIRST
-        make_dirs,   // mkdir -p FIRST
-        copy,        // cp -a FIRST SECOND (a directory), unless SECOND exists
-        move,        // mv FIRST SECOND, unless SECOND exists
-        write,       // printf '%s\n' FIRST >SECOND
+        symlink_to,   // ln -sfn FIRST SECOND
+        remove_entry, // rm -f FIRST
+        remove_tree,  // rm -rf FIRST
+        make_dirs,    // mkdir -p FIRST
+        copy_tree,    // cp -a FIRST SECOND (a directory), unless SECOND exists
+        move_tree,    // mv FIRST SECOND, unless SECOND exists
+        write_word,   // printf '%s\n' FIRST >SECOND
     } verb;
     std::string first, second;
 };

@@ -54,8 +54,8 @@ std::string
 tzlinks(const std::string& inject)
 {
     std::string strace = "strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=";
-    return "exec " + without + (inject.empty() ? "" : strace + inject) + " " + (runner ? runner : "") +
-           " " TZLINKS_BINARY;
+    return "exec " + without + (inject.empty() ? "" : strace + inject) + " " +
+           (runner ? runner : "") + " " TZLINKS_BINARY;
 }
 
 static std::string

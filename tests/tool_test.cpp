@@ -88,7 +88,8 @@ TEST_P(tool, row)
     std::string repaired = run(program(TZLINKS_STATUS_BINARY, "--json")).out;
     EXPECT_EQ("\"health\":\"" + between(repaired, "\"health\":\"", "\"") + "\",\"findings\":[" +
                   std::regex_replace(between(repaired, "\"findings\":[", "],\"health\""),
-                                     std::regex("\\{\"id\":(\"[^\"]*\")[^}]*\\}"), "$1") + "]",
+                                     std::regex("\\{\"id\":(\"[^\"]*\")[^}]*\\}"), "$1") +
+                  "]",
               between(report, "\"after_repair\":{", "}"));
     EXPECT_FALSE(std::regex_search(repaired, std::regex(R"("severity":"error","message":")"
                                                         R"(([^"\\]|\\.)*","commands":\[)")))
