@@ -260,7 +260,7 @@ find_system_version(finder& f)
 {
     velm_simulation& tree = f.now();
     if (kind(tree, velm_path::system_zoneinfo, true) != velm_entry::directory ||
-        (f.r.system.present && f.r.system.version_understood))
+        (f.r.system.present && f.r.system.version_understood) || f.r.system.unreadable)
         return;
     std::string version = std::string(velm_path::system_zoneinfo) + "/+VERSION";
     velm_finding& found =
@@ -391,8 +391,8 @@ find_latest(finder& f)
                        (word.empty() ? "2025b" : word) + ".1.0";
         if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
             kind(tree, renamed) == velm_entry::absent)
-            found.tries = {
-                {{velm_command::move_tree, latest.root, renamed}, ln(renamed, velm_path::latest_link)}};
+            found.tries = {{{velm_command::move_tree, latest.root, renamed},
+                            ln(renamed, velm_path::latest_link)}};
     } else if (!latest.compatible) {
         std::string want = r.system.icu_schema;
         std::string data = latest.root + "/icutz/icutz" + want + ".dat";

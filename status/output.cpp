@@ -119,7 +119,8 @@ json(const velm_dataset_facts& d, const char* extra)
         return "null";
     std::string out = "{\"root\":" + json(d.root) + ",\"version\":" + json(d.version) +
                       ",\"version_understood\":" + json(d.version_understood) +
-                      ",\"icu_schema\":" + json(d.icu_schema);
+                      ",\"icu_schema\":" + json(d.icu_schema) +
+                      ",\"unreadable\":" + json(d.unreadable);
     if (std::string(extra) == "live")
         out += ",\"compatible\":" + json(d.compatible) + ",\"older\":" + json(d.older);
     if (std::string(extra) == "latest")
@@ -173,7 +174,8 @@ dataset(const velm_dataset_facts& d)
 {
     return (d.root.empty() ? "the system data " : "update ") + printable(d.version) +
            (d.version_understood ? "" : " (not a version)") + ", ICU schema " +
-           (d.icu_schema.empty() ? "none" : printable(d.icu_schema));
+           (d.icu_schema.empty() ? (d.unreadable ? "unknown" : "none") : printable(d.icu_schema)) +
+           (d.unreadable ? " (some of its data cannot be read)" : "");
 }
 
 static const char*
@@ -217,8 +219,9 @@ text_report(const velm_report& r)
            link("tz_latest", r.tz_latest);
     if (!r.localtime_zone.empty())
         out += "  The zone is " + printable(r.localtime_zone) + ".\n";
-    out += r.record ? "  The record of the last adoption reads " + printable(*r.record) + ".\n"
-                    : "  There is no record of an adoption.\n";
+    out += r.record_unreadable ? "  The record of the last adoption cannot be read.\n"
+           : r.record ? "  The record of the last adoption reads " + printable(*r.record) + ".\n"
+                      : "  There is no record of an adoption.\n";
     out += "Next boot\n  " + std::string(what_it_does(next.action)) + "\n" +
            link("zoneinfo", next.zoneinfo) + link("icutz", next.icutz) +
            link("localtime", next.localtime);

@@ -154,6 +154,26 @@ read_state(velm_simulation& tree, velm_report& r)
     r.latest.older = latest && *system > *latest;
 }
 
+// What of the datasets and the record could not be read, by the report or
+// by the simulated boot: a schema or version shown then would be wrong.
+static void
+note_unread(const std::map<std::string, int>& unread, velm_report& r)
+{
+    auto below = [&unread](const std::string& top) {
+        for (const auto& [path, error] : unread) {
+            if (error != EFBIG && (path == top || has_prefix(path, (top + "/").c_str())))
+                return true;
+        }
+        return false;
+    };
+    r.system.unreadable = below(velm_path::system_zoneinfo) || below(velm_path::system_icu);
+    for (velm_dataset_facts* update : {&r.live, &r.latest})
+        update->unreadable = !update->root.empty() && below(update->root);
+    if (r.live.root.empty())
+        r.live.unreadable = r.system.unreadable;
+    r.record_unreadable = below(velm_path::record);
+}
+
 // The whole report of the tree as the simulation stands, but for the
 // commands' check; the simulation is left as it was found.
 static velm_report
@@ -172,6 +192,7 @@ survey(velm_simulation& tree, const std::string& root)
         r.after_next = link_at(tree, velm_path::zoneinfo_link);
     }
     tree.rewind(now);
+    note_unread(tree.unread(), r);
     find_problems(tree, r);
     tree.rewind(now);
     r.health = "healthy";

@@ -22,6 +22,7 @@ struct velm_dataset_facts {
     bool compatible = false; // with the system dataset
     bool newer = false;      // latest: than the dataset in use
     bool older = false;      // than the system's
+    bool unreadable = false; // something of its data could not be read
 };
 
 // One run of the boot tool on the simulation, and what it leaves.
@@ -50,6 +51,7 @@ struct velm_finding {
 struct velm_report {
     std::string root; // the directory read, as the commands name it: "" for /
     velm_text zoneinfo, icutz, localtime, tz_latest, record;
+    bool record_unreadable = false;
     bool zoneinfo_understood = false; // names an update's or the system's tz database
     std::string localtime_zone;       // what follows the live tree's prefix, if anything
     velm_dataset_facts live, system, latest;

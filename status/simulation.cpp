@@ -567,16 +567,18 @@ velm_simulation::apply(const velm_command& command)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(
-        command.verb == velm_command::symlink_to ? command.second : command.first,
-        command.verb == velm_command::copy_tree || command.verb == velm_command::move_tree, canonical);
+    velm_entry entry =
+        resolve(command.verb == velm_command::symlink_to ? command.second : command.first,
+                command.verb == velm_command::copy_tree || command.verb == velm_command::move_tree,
+                canonical);
     // Root may change anything but what the kernel refuses to everyone.
     auto refused = [this](const std::string& directory) {
         int error = may_change_in(directory);
         return error == EROFS || error == EPERM;
     };
     bool changes_first = command.verb != velm_command::make_dirs &&
-                         command.verb != velm_command::copy_tree && command.verb != velm_command::write_word;
+                         command.verb != velm_command::copy_tree &&
+                         command.verb != velm_command::write_word;
     if (changes_first && refused(parent_of(canonical)))
         return false;
     velm_entry made;

@@ -157,7 +157,7 @@ TEST(status, command_line)
                             "  It keeps the data in use.\n"),
               std::string::npos);
     std::string system = "\"root\":\"\",\"version\":\"2023c.1.0\",\"version_understood\":true,"
-                         "\"icu_schema\":\"44l\"";
+                         "\"icu_schema\":\"44l\",\"unreadable\":false";
     EXPECT_NE(run(program(TZLINKS_STATUS_BINARY, "--json"))
                   .out.find("\"tz_latest\":\"" + json +
                             "\",\"record\":null,\"localtime_zone\":\"Europe/Paris\",\"live\":{" +
