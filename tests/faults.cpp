@@ -90,7 +90,7 @@ void
 try_faults(const std::string& pristine)
 {
     restore = "rm -rf /var/* && cp -a " + pristine + "/. /var", expected.clear(), counts.clear();
-    run(restore), run("exec strace -f -qq -o " + pristine + ".trace " TZLINKS_BINARY);
+    run(restore), run(tzlinks("", pristine + ".trace"));
     settle(&expected);
     reference = snapshot();
     std::ifstream trace(pristine + ".trace");

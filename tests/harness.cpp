@@ -51,11 +51,13 @@ program(const std::string& path, const std::string& args)
 }
 
 std::string
-tzlinks(const std::string& inject)
+tzlinks(const std::string& inject, const std::string& trace)
 {
-    std::string strace = "strace -f -qq -o /dev/null -E ASAN_OPTIONS=detect_leaks=0 -e inject=";
-    return "exec " + without + (inject.empty() ? "" : strace + inject) + " " +
-           (runner ? runner : "") + " " TZLINKS_BINARY;
+    std::string strace = "strace -f -qq -o " + (trace.empty() ? "/dev/null" : trace) +
+                         " -E ASAN_OPTIONS=detect_leaks=0 " +
+                         (inject.empty() ? "" : "-e inject=" + inject) + " ";
+    bool traced = !inject.empty() || !trace.empty();
+    return "exec " + without + (traced ? strace : "") + (runner ? runner : "") + " " TZLINKS_BINARY;
 }
 
 static std::string

@@ -32,9 +32,9 @@ outcome run(const std::string& command);
 std::string program(const std::string& path, const std::string& args = "");
 void drop_capabilities(const std::string& drop);
 // The same for tzlinks, under strace failing calls as inject says (its
-// inject= expression) when that is not empty; leak checks cannot run under
-// ptrace.
-std::string tzlinks(const std::string& inject = "");
+// inject= expression) or writing its trace to a file when either is not
+// empty; leak checks cannot run under ptrace.
+std::string tzlinks(const std::string& inject = "", const std::string& trace = "");
 
 // Every entry below /var and /usr/share, by path: "->target" for a link,
 // "=content" for a file, "/" for a directory, "|" for anything else; with
