@@ -129,22 +129,44 @@ json(const velm_dataset_facts& d, const char* extra)
 }
 
 std::string
-json_report(const velm_report& r)
+json_text(const std::string& text)
 {
-    const auto& next = r.next_boot;
-    std::string messages, findings;
-    for (const std::string& message : next.messages)
-        messages += (messages.empty() ? "" : ",") + json(message);
-    for (const velm_finding& f : r.findings) {
+    return json(text);
+}
+
+std::string
+json_findings(const std::vector<velm_finding>& findings, const std::string& root)
+{
+    std::string out;
+    for (const velm_finding& f : findings) {
         std::string commands;
         for (const velm_command& command : f.commands.value_or(velm_commands()))
-            commands += (commands.empty() ? "" : ",") + json(shell_text(command, r.root));
-        findings += std::string(findings.empty() ? "" : ",") + "{\"id\":" + json(f.id) +
-                    ",\"severity\":" + json(f.severity) + ",\"message\":" + json(f.message) +
-                    ",\"commands\":" + (f.commands ? "[" + commands + "]" : "null") +
-                    ",\"manual\":" + json(f.manual.empty() ? velm_text() : f.manual) +
-                    ",\"verified\":" + json(f.verified) + "}";
+            commands += (commands.empty() ? "" : ",") + json(shell_text(command, root));
+        out += std::string(out.empty() ? "" : ",") + "{\"id\":" + json(f.id) +
+               ",\"severity\":" + json(f.severity) + ",\"message\":" + json(f.message) +
+               ",\"commands\":" + (f.commands ? "[" + commands + "]" : "null") +
+               ",\"manual\":" + json(f.manual.empty() ? velm_text() : f.manual) +
+               ",\"verified\":" + json(f.verified) + "}";
     }
+    return "[" + out + "]";
+}
+
+std::string
+json_run(const velm_run& next)
+{
+    std::string messages;
+    for (const std::string& message : next.messages)
+        messages += (messages.empty() ? "" : ",") + json(message);
+    return "{\"action\":" + json(next.action) + ",\"zoneinfo\":" + json(next.zoneinfo) +
+           ",\"icutz\":" + json(next.icutz) + ",\"localtime\":" + json(next.localtime) +
+           ",\"record\":" + json(next.record) +
+           ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
+           "]}";
+}
+
+std::string
+json_report(const velm_report& r)
+{
     std::string remaining;
     for (const std::string& id : r.repaired_findings)
         remaining += (remaining.empty() ? "" : ",") + json(id);
@@ -153,12 +175,8 @@ json_report(const velm_report& r)
            ",\"record\":" + json(r.record) + ",\"localtime_zone\":" +
            json(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +
            ",\"live\":" + json(r.live, "live") + ",\"system\":" + json(r.system, "") +
-           ",\"latest\":" + json(r.latest, "latest") + R"(,"next_boot":{"action":)" +
-           json(next.action) + ",\"zoneinfo\":" + json(next.zoneinfo) +
-           ",\"icutz\":" + json(next.icutz) + ",\"localtime\":" + json(next.localtime) +
-           ",\"record\":" + json(next.record) +
-           ",\"exit_status\":" + std::to_string(next.exit_status) + ",\"messages\":[" + messages +
-           "]},\"findings\":[" + findings + "],\"health\":" + json(r.health) +
+           ",\"latest\":" + json(r.latest, "latest") + ",\"next_boot\":" + json_run(r.next_boot) +
+           ",\"findings\":" + json_findings(r.findings, r.root) + ",\"health\":" + json(r.health) +
            R"(,"after_repair":{"health":)" + json(r.repaired_health) + ",\"findings\":[" +
            remaining + "]}}\n";
 }
@@ -202,9 +220,34 @@ repair(const velm_finding& f, const std::string& root)
 }
 
 std::string
+text_run(const velm_run& next)
+{
+    std::string out = "  " + std::string(what_it_does(next.action)) + "\n" +
+                      link("zoneinfo", next.zoneinfo) + link("icutz", next.icutz) +
+                      link("localtime", next.localtime);
+    out += next.record ? "  It records " + printable(*next.record) + ".\n"
+                       : "  It leaves the record as it is.\n";
+    for (const std::string& message : next.messages)
+        out += "  It says: " + printable(message) + "\n";
+    if (next.exit_status != 0)
+        out += "  It exits with status " + std::to_string(next.exit_status) + ".\n";
+    return out;
+}
+
+std::string
+text_findings(const std::vector<velm_finding>& findings, const std::string& root)
+{
+    std::string out;
+    for (const velm_finding& f : findings) {
+        out += "  " + f.severity + " " + f.id + ": " + printable(f.message) + "\n";
+        out += "    " + repair(f, root) + "\n";
+    }
+    return out;
+}
+
+std::string
 text_report(const velm_report& r)
 {
-    const auto& next = r.next_boot;
     std::string out =
         "Now\n  In use: " +
         (r.live.present ? dataset(r.live) : std::string("no data the boot tool understands")) +
@@ -222,22 +265,12 @@ text_report(const velm_report& r)
     out += r.record_unreadable ? "  The record of the last adoption cannot be read.\n"
            : r.record ? "  The record of the last adoption reads " + printable(*r.record) + ".\n"
                       : "  There is no record of an adoption.\n";
-    out += "Next boot\n  " + std::string(what_it_does(next.action)) + "\n" +
-           link("zoneinfo", next.zoneinfo) + link("icutz", next.icutz) +
-           link("localtime", next.localtime);
-    out += next.record ? "  It records " + printable(*next.record) + ".\n"
-                       : "  It leaves the record as it is.\n";
-    for (const std::string& message : next.messages)
-        out += "  It says: " + printable(message) + "\n";
-    if (next.exit_status != 0)
-        out += "  It exits with status " + std::to_string(next.exit_status) + ".\n";
+    out += "Next boot\n" + text_run(r.next_boot);
     out += r.findings.empty() ? "Findings: none.\n" : "Findings\n";
+    out += text_findings(r.findings, r.root);
     bool any = false;
-    for (const velm_finding& f : r.findings) {
-        out += "  " + f.severity + " " + f.id + ": " + printable(f.message) + "\n";
-        out += "    " + repair(f, r.root) + "\n";
+    for (const velm_finding& f : r.findings)
         any = any || (f.commands && !f.commands->empty());
-    }
     out += "Health: " + r.health + ".\n";
     if (any)
         out += "After these repairs and one boot: " + r.repaired_health + ".\n";

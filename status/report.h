@@ -78,6 +78,13 @@ void find_problems(velm_simulation& tree, velm_report& r);
 const size_t longest_text = 8192;
 std::string text_report(const velm_report& report);
 std::string json_report(const velm_report& report);
+// Parts of both, for other reports made of them: a JSON string, findings
+// and a run as the reports show them.
+std::string json_text(const std::string& text);
+std::string json_findings(const std::vector<velm_finding>& findings, const std::string& root);
+std::string json_run(const velm_run& run);
+std::string text_findings(const std::vector<velm_finding>& findings, const std::string& root);
+std::string text_run(const velm_run& run);
 // Every finding's commands, in the report's order: a script for sh -e.
 std::string commands_report(const velm_report& report);
 

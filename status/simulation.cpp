@@ -226,11 +226,11 @@ velm_simulation::rewind(const changes& to)
 }
 
 std::string
-velm_simulation::where(const std::string& path)
+velm_simulation::where(const std::string& path, bool follow)
 {
     int saved = errno;
     std::string canonical;
-    resolve(path, false, canonical);
+    resolve(path, follow, canonical);
     errno = saved;
     return canonical;
 }

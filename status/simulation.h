@@ -84,8 +84,9 @@ class velm_simulation final : public velm_system_calls {
     };
     changes checkpoint();
     void rewind(const changes& to);
-    // Where path leads inside the root, its last component not followed.
-    std::string where(const std::string& path);
+    // Where path leads inside the root, its last component not followed
+    // (or followed).
+    std::string where(const std::string& path, bool follow = false);
     // Whether the last run of the boot wrote the file at path.
     bool written(const std::string& path);
 

@@ -6,6 +6,7 @@
 #   system_dataset 2023c 44l       tz database 2023c and ICU schema 44l on
 #                                  the system partition
 #   update_dataset 2024a.1.0 44l   an unpacked update below /var/db/timezone/tz
+#   update_source DIR 2024a 44l    the same, to be staged, in DIR
 #   put_link TARGET PATH           a symbolic link, parents created
 #   put_file PATH TEXT             a file holding TEXT (printf %b escapes:
 #                                  \n, \t, \0NNN), parents created
@@ -48,14 +49,17 @@ system_dataset() {
     mkdir -p "$TREE/var/db/timezone/tz"
 }
 
-update_dataset() {
-    local root=/var/db/timezone/tz/$1
-    put_file "$root/zoneinfo/+VERSION" "${1%%.*}
+# update_source DIR RELEASE SCHEMA: an update as it is unpacked into DIR.
+update_source() {
+    put_file "$1/zoneinfo/+VERSION" "$2
 "
-    put_zones "$root/zoneinfo"
+    put_zones "$1/zoneinfo"
     # What ICU's data files begin with: a header size, then 0xda 0x27.
-    put_file "$root/icutz/icutz$2.dat" '\0040\0000\0332\0047icu-data'
+    put_file "$1/icutz/icutz$3.dat" '\0040\0000\0332\0047icu-data'
+}
 
+update_dataset() {
+    update_source "/var/db/timezone/tz/$1" "${1%%.*}" "$2"
 }
 
 # Shortcuts for whole device states (links of the live dataset and a
