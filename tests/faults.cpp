@@ -93,19 +93,8 @@ try_faults(const std::string& pristine)
     run(restore), run(tzlinks("", pristine + ".trace"));
     settle(&expected);
     reference = snapshot();
-    std::ifstream trace(pristine + ".trace");
-    std::map<std::string, int> seen;
-    bool started = false;
-    std::smatch call;
-    const std::regex line("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += "),
-        changing("unlink|symlink|rmdir|ftruncate|write");
-    for (std::string text; std::getline(trace, text);) {
-        if (!std::regex_search(text, call, line))
-            continue;
-        std::string name = call[1], when = std::to_string(++seen[name]), args = call[2];
-        started = started || args.find("/var/db/timezone") != std::string::npos;
-        if (!started || (name == "write" && args.compare(0, 2, "2,") == 0))
-            continue; // the loader's calls, and the warnings' own writes
+    const std::regex changing("unlink|symlink|rmdir|ftruncate|write");
+    for (const auto& [name, when, args] : calls_in(pristine + ".trace")) {
         bool changes =
             args.find("O_CREAT") != std::string::npos || std::regex_match(name, changing);
         for (auto [f, end] = failures.equal_range(name); f != end; ++f)
@@ -119,4 +108,26 @@ try_faults(const std::string& pristine)
     for (const char* count : {"injected", "lasting", "cuts", "same", "different", "broken"})
         std::cout << " " << count << " " << counts[count];
     std::cout << "\n";
+}
+
+std::vector<traced_call>
+calls_in(const std::string& trace)
+{
+    std::ifstream in(trace);
+    std::map<std::string, int> seen;
+    std::vector<traced_call> calls;
+    bool started = false;
+    std::smatch call;
+    const std::regex line("^[0-9]+ +([a-z0-9_]+)\\((.*)\\) += ");
+    for (std::string text; std::getline(in, text);) {
+        if (!std::regex_search(text, call, line))
+            continue;
+        std::string name = call[1], when = std::to_string(++seen[name]), args = call[2];
+        started = started || args.find("/var/db/timezone") != std::string::npos;
+        bool message =
+            name == "write" && (args.compare(0, 2, "1,") == 0 || args.compare(0, 2, "2,") == 0);
+        if (started && !message) // not the loader's calls, nor the messages' own writes
+            calls.push_back({name, when, args});
+    }
+    return calls;
 }

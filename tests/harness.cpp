@@ -30,12 +30,20 @@ static const std::string live_dir = "/var/db/timezone/";
 bool
 fresh_tree()
 {
+    static bool etc = false; // once a process: the host's /etc with changes of its own
     std::string map;
     std::getline(std::ifstream("/proc/self/uid_map"), map);
-    return map.find("4294967295") == std::string::npos &&
-           mount("tzlinks-test", "/var", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
-           mount("tzlinks-test", "/usr/share", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
-           mount("tzlinks-test", "/etc", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0;
+    if (map.find("4294967295") != std::string::npos)
+        return false;
+    if (!etc && (mount("tzlinks-test", "/tmp", "tmpfs", MS_NOSUID | MS_NODEV, "mode=1777") != 0 ||
+                 mkdir("/tmp/.etc", 0700) != 0 || mkdir("/tmp/.etc/upper", 0755) != 0 ||
+                 mkdir("/tmp/.etc/work", 0700) != 0 ||
+                 mount("tzlinks-test", "/etc", "overlay", MS_NOSUID | MS_NODEV,
+                       "lowerdir=/etc,upperdir=/tmp/.etc/upper,workdir=/tmp/.etc/work") != 0))
+        return false;
+    etc = true;
+    return mount("tzlinks-test", "/var", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
+           mount("tzlinks-test", "/usr/share", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0;
 }
 
 bool

@@ -11,7 +11,8 @@
 #include <string>
 #include <vector>
 
-// Puts empty file systems over /var, /usr/share and /etc; false when refused,
+// Puts empty file systems over /var, /usr/share and /tmp, and one over /etc
+// that keeps the host's files but none of the changes; false when refused,
 // and always outside a user namespace of the tests' own.
 bool fresh_tree();
 // Runs the sample-tree builders (tools/sample-tree.sh) on the fixed paths.
@@ -50,6 +51,13 @@ struct row {
 std::vector<row> load_rows();
 // The fault and power-cut runs of a row, from its tree kept at pristine.
 void try_faults(const std::string& pristine);
+// The calls a trace (strace -f -o) holds from the first that names
+// /var/db/timezone on, but for the writes of messages (to 1 or 2): each
+// with its name, which of the calls of that name it is, and its arguments.
+struct traced_call {
+    std::string name, when, args;
+};
+std::vector<traced_call> calls_in(const std::string& trace);
 // What changed between two snapshots, in the rows' notation.
 std::vector<std::string> changes(std::map<std::string, std::string> before,
                                  const std::map<std::string, std::string>& after);

@@ -86,7 +86,8 @@ latest() {
 
 # /etc/localtime as an image has it: through the boot's localtime link.
 etc_localtime() {
-    put_link $tz/localtime /etc/localtime
+    mkdir -p "$TREE/etc"
+    ln -sfn $tz/localtime "$TREE/etc/localtime"
 }
 
 # The demo's device, as an image leaves it before its first boot: system
@@ -100,4 +101,33 @@ demo_device() {
     put_link /usr/share/zoneinfo/Europe/Paris $tz/localtime
     put_link /usr/share/icu /var/db/icutz
     etc_localtime
+}
+
+# real_update_source DIR RELEASE: an update made of real parts: zone files
+# compiled by zic from a small source (Europe/Paris abbreviated XPT, so
+# that a reader shows whose data it read), and ICU's own time-zone data,
+# taken from this machine's ICU library with icupkg, its version set to
+# RELEASE with derb and genrb, packed as icutz44l.dat beside its .res files
+# (ICU's readers load those through ICU_TIMEZONE_FILES_DIR).
+real_update_source() {
+    local dir=$TREE$1 release=$2 work lib
+    work=$(mktemp -d)
+    mkdir -p "$dir/zoneinfo" "$dir/icutz" "$work/res"
+    printf 'Zone Europe/Paris 1:00 - XPT\nZone America/Los_Angeles -8:00 - XLT\n' >"$work/zones"
+    zic -d "$dir/zoneinfo" "$work/zones"
+    printf '%s\n' "$release" >"$dir/zoneinfo/+VERSION"
+    # The library's data is one ICU data package in its read-only data:
+    # symbol address and size, section address and file offset.
+    lib=$(ls /usr/lib/*-linux-gnu/libicudata.so.[0-9]* | head -n 1)
+    set -- $(nm -D -S "$lib" | awk '/ icudt[0-9]+_dat$/ { print $1, $2 }') \
+        $(readelf -SW "$lib" | awk '{ for (i = 1; i < NF; i++) if ($i == ".rodata") print $(i + 2), $(i + 3) }')
+    tail -c +$((0x$1 - 0x$3 + 0x$4 + 1)) "$lib" | head -c $((0x$2)) >"$work/icu.dat"
+    printf '%s\n' zoneinfo64.res metaZones.res timezoneTypes.res windowsZones.res >"$work/list"
+    icupkg -d "$work/res" -x "$work/list" "$work/icu.dat"
+    (cd "$work/res" && derb -c ./zoneinfo64.res 2>/dev/null) |
+        sed "s/TZVersion { \"[^\"]*\" }/TZVersion { \"$release\" }/" >"$work/zoneinfo64.txt"
+    genrb -q -d "$work/res" "$work/zoneinfo64.txt"
+    icupkg -tl -s "$work/res" -a "$work/list" new "$dir/icutz/icutz44l.dat"
+    cp "$work"/res/*.res "$dir/icutz/"
+    rm -rf "$work"
 }

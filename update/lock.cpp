@@ -1,13 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
 // One tzlinks-update at a time changes a device: a lock on a file in the
-// link directory, held until the program ends.
+// link directory, held until the program ends, that names its holder.
 #include "update/update.h"
 
 #include "support/paths.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <cstdlib>
 #include <err.h>
 #include <fcntl.h>
+#include <string>
+#include <sys/file.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -15,29 +19,30 @@ int
 take_lock(const velm_device& device, int seconds)
 {
     std::string path = device.at(velm_path::link_directory) + "/.tzlinks-update.lock";
-    // Left open: closing any descriptor of the file would let the lock go.
-    int fd = open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0600);
+    // Left open, and so held, until the program ends.
+    int fd = open(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0644);
     if (fd < 0) {
         warn("cannot lock %s", path.c_str());
         return 74;
     }
-    struct flock lock = {};
-    lock.l_type = F_WRLCK, lock.l_whence = SEEK_SET;
     const timespec tenth = {0, 100000000};
-    for (int tenths = 0;; ++tenths) {
-        if (fcntl(fd, F_SETLK, &lock) == 0)
-            return 0;
-        if (errno != EACCES && errno != EAGAIN) {
+    for (int tenths = 0; flock(fd, LOCK_EX | LOCK_NB) != 0; ++tenths) {
+        if (errno != EWOULDBLOCK) {
             warn("cannot lock %s", path.c_str());
             return 74;
         }
-        if (tenths >= seconds * 10)
-            break;
+        if (tenths >= seconds * 10) {
+            char holder[32] = "";
+            ssize_t n = pread(fd, holder, sizeof holder - 1, 0);
+            holder[std::max(n, ssize_t(0))] = '\0';
+            warnx("%s is held by process %d: gave up after %d s", path.c_str(), atoi(holder),
+                  seconds);
+            return 75;
+        }
         (void)nanosleep(&tenth, nullptr);
     }
-    struct flock held = lock;
-    if (fcntl(fd, F_GETLK, &held) != 0 || held.l_type == F_UNLCK)
-        held.l_pid = 0;
-    warnx("%s is held by process %d: gave up after %d s", path.c_str(), held.l_pid, seconds);
-    return 75;
+    std::string pid = std::to_string(getpid()) + "\n";
+    if (ftruncate(fd, 0) != 0 || pwrite(fd, pid.data(), pid.size(), 0) < 0)
+        warn("cannot name this process in %s", path.c_str());
+    return 0;
 }

@@ -191,7 +191,7 @@ examine_source(int src, const std::string& name, const std::string& version,
                                                     "data files begin with)") +
                                     ": ICU's readers would fail.",
                                 "ICU data built by ICU's tools as " + name + "/icutz/" + data));
-    if (!zone.empty() &&
+    if (!zone.empty() && fstatat(src, "zoneinfo", &st, 0) == 0 && S_ISDIR(st.st_mode) &&
         start_of(src, "zoneinfo/" + zone, 4).value_or("").compare(0, 4, "TZif") != 0)
         found.push_back(problem("warning", "source-lacks-zone", name + "/zoneinfo/" + zone,
                                 name + "/zoneinfo/" + zone +

@@ -1,0 +1,198 @@
+// SPDX-License-Identifier: Apache-2.0
+// Runs the rows of tests/update.rows: the real tzlinks-update on a sample
+// device in the sandbox; with TZLINKS_FAULTS set, each stage and prune row
+// again with every changing call failing once, and killed on entry to each:
+// tz_latest must then name the update it named before or the whole new
+// one, the device's links must be untouched, tzlinks-status must find no
+// error that was not there, and the same command run again must complete.
+#include "harness.h"
+
+#include <fstream>
+#include <gtest/gtest.h>
+#include <iostream>
+#include <regex>
+#include <unistd.h>
+
+namespace {
+
+struct update_row {
+    std::string name, caps, tree, args, expect;
+    bool faults = false;
+};
+
+std::vector<update_row>
+load()
+{
+    std::ifstream in(TZLINKS_SOURCE_DIR "/tests/update.rows");
+    std::vector<std::string> lines;
+    for (std::string line; std::getline(in, line);) {
+        for (size_t at; (at = line.find('@')) != std::string::npos;)
+            line.replace(at, 1, "/var/db/timezone/tz/");
+        if (line[0] == ' ')
+            lines.back() += line;
+        else if (!line.empty() && line[0] != '#')
+            lines.push_back(line);
+    }
+    std::vector<update_row> rows;
+    for (const std::string& line : lines) {
+        std::vector<std::string> f;
+        std::istringstream split(line);
+        for (std::string field; std::getline(split, field, '|');)
+            f.push_back(
+                field.substr(field.find_first_not_of(' '),
+                             field.find_last_not_of(' ') + 1 - field.find_first_not_of(' ')));
+        std::istringstream head(f.at(0));
+        update_row r;
+        head >> r.name;
+        for (std::string option; head >> option;) {
+            if (option.compare(0, 5, "caps=") == 0)
+                r.caps = option.substr(5);
+            r.faults = r.faults || option == "faults";
+        }
+        r.tree = f.at(1), r.args = f.at(2), r.expect = f.at(3);
+        rows.push_back(r);
+    }
+    return rows;
+}
+
+std::string
+update(const std::string& args)
+{
+    return program(TZLINKS_UPDATE_BINARY, args);
+}
+
+// What a row's checks read: tz_latest's update and the names below tz/.
+std::string
+state()
+{
+    std::string latest = run("readlink /var/db/timezone/tz_latest").out;
+    return "latest=" + (latest.empty() ? "-" : latest.substr(20, latest.size() - 21)) +
+           " tz=" + run("ls -A /var/db/timezone/tz | paste -sd, | tr -d '\\n'").out;
+}
+
+std::string
+latest_of(const std::string& state)
+{
+    return state.substr(0, state.find(' '));
+}
+
+std::string
+links()
+{
+    return run("cd /var/db/timezone && readlink zoneinfo icutz localtime").out;
+}
+
+// The first of a report's words that follow what.
+std::string
+word_after(const std::string& json, const std::string& what)
+{
+    std::smatch m;
+    return std::regex_search(json, m, std::regex(what + "\"([^\"]*)\"")) ? m[1].str() : "";
+}
+
+// The errors tzlinks-status finds.
+std::string
+errors()
+{
+    std::string report = run(program(TZLINKS_STATUS_BINARY, "--json")).out, found;
+    static const std::regex error(R"re(\{"id":"([^"]*)","severity":"error")re");
+    for (std::sregex_iterator m(report.begin(), report.end(), error), end; m != end; ++m)
+        found += (*m)[1].str() + " ";
+    return found;
+}
+
+// Every changing call of the command fails once, and the command is cut
+// on entry to each; then the invariants, and the same command again, which
+// must leave what the command left uninterrupted (a stage: tz_latest).
+void
+try_update_faults(const std::string& args, const std::string& pristine, const std::string& done)
+{
+    std::string restore = "rm -rf /var/* && cp -a " + pristine + "/. /var";
+    run(restore);
+    std::string was = links(), latest_was = latest_of(state()), errors_were = errors();
+    std::string command = update(args).substr(5); // without its exec
+    run("exec strace -f -qq -o " + pristine + ".trace " + command);
+    const std::regex changing("mkdirat|openat|write|pwrite64|fchmod|syncfs|fsync|renameat2?|"
+                              "symlinkat|unlinkat|ftruncate");
+    bool staging = args.compare(0, 5, "stage") == 0;
+    int injected = 0, cuts = 0;
+    for (const auto& [name, when, call] : calls_in(pristine + ".trace")) {
+        if (!std::regex_match(name, changing) ||
+            (name == "openat" && call.find("O_CREAT") == std::string::npos))
+            continue;
+        for (const char* how : {":error=EIO", ":signal=KILL"}) {
+            run(restore);
+            std::string inject = name + how + ":when=" + when;
+            run("exec strace -f -qq -o /dev/null -e inject=" + inject + " " + command);
+            std::string latest = latest_of(state());
+            EXPECT_TRUE(latest == latest_was || latest == latest_of(done))
+                << inject << ": " << latest;
+            EXPECT_EQ(links(), was) << inject;
+            EXPECT_EQ(errors(), errors_were) << inject;
+            EXPECT_EQ(run(update(args)).status, 0) << inject << ": again";
+            EXPECT_EQ(staging ? latest_of(state()) : state(), staging ? latest_of(done) : done)
+                << inject << ": again";
+            ++(how[1] == 'e' ? injected : cuts);
+        }
+    }
+    std::cout << "UPDATE FAULTS injected " << injected << " cuts " << cuts << "\n";
+}
+
+class update_tool : public ::testing::TestWithParam<update_row> {};
+
+TEST_P(update_tool, row)
+{
+    const update_row& r = GetParam();
+    drop_capabilities(r.caps);
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree)) << r.tree;
+    bool checking = r.args.compare(0, 5, "check") == 0,
+         staging = r.args.compare(0, 5, "stage") == 0;
+    std::string source = std::regex_replace(r.args, std::regex("^stage|--force|--wait [0-9]+"), "");
+    std::string judged = checking || staging ? run(update("check " + source + " --json")).out
+                                             : run(update(r.args)).out;
+    bool faults = getenv("TZLINKS_FAULTS") != nullptr && r.faults;
+    std::string pristine = faults ? run("d=$(mktemp -d) && cp -a /var/. $d && printf $d").out : "";
+    auto before = snapshot();
+    outcome o = run(update(r.args));
+    std::string done = state();
+    std::string got = "exit=" + std::to_string(o.status);
+    if (r.expect.find("problems=") != std::string::npos) {
+        size_t from = judged.find("\"problems\":["), to = judged.find("],\"then\"");
+        std::string problems = judged.substr(from, to - from), ids;
+        static const std::regex id(R"re(\{"id":"([^"]*)")re");
+        for (std::sregex_iterator m(problems.begin(), problems.end(), id), end; m != end; ++m)
+            ids += (ids.empty() ? "" : ",") + (*m)[1].str();
+        got += " problems=" + ids;
+    }
+    if (r.expect.find("latest=") != std::string::npos)
+        got += " " + (r.expect.find(" tz=") != std::string::npos ? done : latest_of(done));
+    EXPECT_EQ(got, r.expect) << o.out << o.err;
+    auto after = snapshot();
+    after.erase("/var/db/timezone/.tzlinks-update.lock");
+    if (checking || o.status != 0) {
+        EXPECT_EQ(changes(before, after), std::vector<std::string>()) << "it changed the tree";
+    }
+    if (staging && o.status == 0) {
+        std::string latest = run("readlink -n /var/db/timezone/tz_latest").out;
+        EXPECT_EQ(run("diff -r /var/tmp/src " + latest).status, 0);
+        // The boot then does what check foretold.
+        run(tzlinks());
+        EXPECT_EQ(word_after(run(program(TZLINKS_STATUS_BINARY, "--json")).out, "\"health\":"),
+                  word_after(judged, "\"then\":\\{\"health\":"));
+    }
+    if (faults && o.status == 0)
+        try_update_faults(r.args, pristine, done);
+}
+
+// A failing row is named by its name.
+void
+PrintTo(const update_row& r, std::ostream* out)
+{
+    *out << r.name;
+}
+
+INSTANTIATE_TEST_SUITE_P(tzlinks_update, update_tool, ::testing::ValuesIn(load()),
+                         [](const auto& each) { return each.param.name; });
+
+} // namespace
