@@ -62,6 +62,17 @@ quoted(const velm_text& text)
     return text ? "\"" + *text + "\"" : "nothing";
 }
 
+// What stands at one of the links, in words: its target, or what it is.
+std::string
+standing(velm_simulation& tree, const std::string& path)
+{
+    velm_entry entry = tree.look(path);
+    return entry.kind == velm_entry::link        ? "names \"" + entry.text + "\""
+           : entry.kind == velm_entry::absent    ? "is missing"
+           : entry.kind == velm_entry::directory ? "is a directory, not a link"
+                                                 : "is no link";
+}
+
 std::string
 schema(const std::string& text)
 {
@@ -190,8 +201,7 @@ find_places(finder& f)
         f.add("note", "unverified", "",
               "tzlinks-status runs as user " + std::to_string(geteuid()) +
                   ", not as root as the boot does: the kernel was not asked whether the boot may "
-                  "change the tree, and what only root may read was not read; the prediction "
-                  "takes it that root may.");
+                  "change the tree, and what only root may read is taken as missing.");
     velm_entry directory = tree.look(velm_path::link_directory, true);
     if (directory.kind != velm_entry::directory) {
         velm_finding& no =
@@ -237,8 +247,7 @@ find_unread(finder& f, const std::map<std::string, int>& unread)
     for (const auto& [path, error] : unread) {
         if (error == EFBIG) {
             f.add("note", "read-in-part", path,
-                  path + " is longer than this report reads: only its start was read, and the "
-                         "prediction takes it as that long.");
+                  path + " is longer than this report reads: only its start was read.");
             continue;
         }
         // Only a loop of links or an over-long name stops root: what to do
@@ -298,26 +307,31 @@ find_live(finder& f)
     velm_commands system = {rm(velm_path::zoneinfo_link), rm(velm_path::latest_link)};
     if (kind(tree, velm_path::zoneinfo_link, true) != velm_entry::directory) {
         f.add("error", "zoneinfo-unusable", velm_path::zoneinfo_link,
-              std::string(velm_path::zoneinfo_link) + " names " + quoted(r.zoneinfo) +
+              std::string(velm_path::zoneinfo_link) + " " +
+                  standing(tree, velm_path::zoneinfo_link) +
                   ", which leads to no tz database: programs have none; " + consequence + ".")
             .tries = {{}, reset, system};
     } else if (said(r.next_boot, velm_says::invalid_current)) {
         f.add("warning", "zoneinfo-not-understood", velm_path::zoneinfo_link,
-              std::string(velm_path::zoneinfo_link) + " names " + quoted(r.zoneinfo) +
-                  ", which is neither an update below " + velm_path::updates + " nor " +
-                  velm_path::system_zoneinfo + ": " + consequence + ".")
+              std::string(velm_path::zoneinfo_link) + " " +
+                  standing(tree, velm_path::zoneinfo_link) + ", which is neither an update below " +
+                  velm_path::updates + " nor " + velm_path::system_zoneinfo + ": " + consequence +
+                  ".")
             .tries = {{}, reset, system};
     }
     if (!said(r.next_boot, velm_says::incompatible))
         return;
-    std::string why = !r.live.present      ? "has a version number too large"
-                      : !r.live.compatible ? "has ICU schema " + schema(r.live.icu_schema) +
-                                                 ", the system data " + schema(r.system.icu_schema)
-                      : !r.live.version_understood
-                          ? "is named \"" + r.live.version +
-                                "\", which is not a version and counts as older "
-                                "than the system data"
-                          : "is older than the system data, " + r.system.version;
+    std::string why =
+        !r.live.present ? "has a version number too large"
+        : !r.live.compatible
+            ? "has ICU schema " +
+                  (r.live.unreadable && r.live.icu_schema.empty() ? std::string("unknown")
+                                                                  : schema(r.live.icu_schema)) +
+                  ", the system data " + schema(r.system.icu_schema)
+        : !r.live.version_understood ? "is named \"" + r.live.version +
+                                           "\", which is not a version and counts as older "
+                                           "than the system data"
+                                     : "is older than the system data, " + r.system.version;
     f.add("warning", "live-rejected", velm_path::zoneinfo_link,
           "The data in use, " + (r.live.present ? r.live.version : r.live.root) + ", " + why +
               ": the next boot sets it aside and " + what_it_does(r.next_boot) + ".")
@@ -403,8 +417,10 @@ find_latest(finder& f)
                         ", readable by others): no boot adopts it."
                   : name + ", whose ICU data has schema " + latest.icu_schema +
                         "; the system's is " + schema(want) + ": no boot adopts it.")
-            .manual = "ICU data built for schema " + want + ", as " + data +
-                      ", a regular file readable by others";
+            .manual = want.empty() ? "the system's ICU schema, such as 44l, as the first word of " +
+                                         std::string(velm_path::system_icu) + "/icutzformat.txt"
+                                   : "ICU data built for schema " + want + ", as " + data +
+                                         ", a regular file readable by others";
     } else if (latest.older) {
         f.add("warning", "latest-older-than-system", latest.root,
               name + ", older than the system data, " + r.system.version +
@@ -511,6 +527,8 @@ find_next_boot(finder& f)
                            (why == strerror(EROFS) ? ", on a file system mounted read-write" : "");
         else if (!failed.empty())
             found.tries = {clear(failed), {{velm_command::make_dirs, velm_path::updates, ""}}};
+        else
+            found.tries = {{}}, found.manual = "the repairs of the findings above";
         return;
     }
     velm_simulation& tree = f.next();
@@ -583,7 +601,8 @@ find_localtime(finder& f)
         found.tries = {{}};
         if (!zone.empty())
             found.tries.push_back(to_zone);
-        found.tries.push_back({rm(velm_path::localtime_link)});
+        // The boot's own default, said in the command rather than left to it.
+        found.tries.push_back(relink(velm_path::default_localtime, velm_path::localtime_link));
     } else if (next.localtime != r.localtime && next.localtime == velm_path::default_localtime) {
         bool legacy =
             r.localtime &&

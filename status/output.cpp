@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "status/report.h"
 
+#include "support/paths.h"
+
 #include <algorithm>
 
 // How many bytes from text[i] on form one valid UTF-8 character, or 0.
@@ -45,7 +47,7 @@ cut(const std::string& text)
     size_t end = longest_text;
     while (end > longest_text - 3 && (static_cast<unsigned char>(text[end]) & 0xc0) == 0x80)
         --end;
-    return text.substr(0, end) + "[cut: " + std::to_string(text.size() - end) + " more bytes]";
+    return text.substr(0, end) + "[cut]";
 }
 
 // Whether the character at text[i], n bytes long, is a control character:
@@ -79,11 +81,12 @@ printable(const std::string& whole)
 }
 
 // A JSON string. A byte that is not part of valid UTF-8 becomes \udcHH,
-// the surrogate escape: decoders that know it give the byte back.
+// the surrogate escape: decoders that know it give the byte back. A text
+// longer than longest_text is cut, but for a command, which has to run.
 static std::string
-json(const std::string& whole)
+json(const std::string& whole, bool whole_text = false)
 {
-    std::string text = cut(whole), out = "\"";
+    std::string text = whole_text ? whole : cut(whole), out = "\"";
     for (size_t i = 0; i < text.size();) {
         size_t n = utf8_length(text, i);
         auto c = static_cast<unsigned char>(text[i]);
@@ -141,7 +144,7 @@ json_findings(const std::vector<velm_finding>& findings, const std::string& root
     for (const velm_finding& f : findings) {
         std::string commands;
         for (const velm_command& command : f.commands.value_or(velm_commands()))
-            commands += (commands.empty() ? "" : ",") + json(shell_text(command, root));
+            commands += (commands.empty() ? "" : ",") + json(shell_text(command, root), true);
         out += std::string(out.empty() ? "" : ",") + "{\"id\":" + json(f.id) +
                ",\"severity\":" + json(f.severity) + ",\"message\":" + json(f.message) +
                ",\"commands\":" + (f.commands ? "[" + commands + "]" : "null") +
@@ -252,7 +255,10 @@ text_report(const velm_report& r)
         "Now\n  In use: " +
         (r.live.present ? dataset(r.live) : std::string("no data the boot tool understands")) +
         ".\n  System: " +
-        (r.system.present ? dataset(r.system) : std::string("none that can be read")) + ".\n";
+        (r.system_missing ? "none: " + std::string(velm_path::system_zoneinfo) + " is no directory"
+         : r.system.present ? dataset(r.system)
+                            : std::string("none that can be read")) +
+        ".\n";
     if (r.latest.present)
         out += "  Latest: " + dataset(r.latest) + "; " +
                (r.latest.compatible ? "compatible with" : "incompatible with") +
@@ -282,8 +288,9 @@ commands_report(const velm_report& r)
 {
     std::string out;
     for (const velm_finding& f : r.findings) {
+        // What the simulation did not show to work is shown, never run.
         for (const velm_command& command : f.commands.value_or(velm_commands()))
-            out += shell_text(command, r.root) + "\n";
+            out += (f.verified ? "" : "# not shown to work: ") + shell_text(command, r.root) + "\n";
     }
     return out;
 }

@@ -118,6 +118,7 @@ read_state(velm_simulation& tree, velm_report& r)
     r.icutz = link_at(tree, velm_path::icutz_link);
     r.localtime = link_at(tree, velm_path::localtime_link);
     r.tz_latest = link_at(tree, velm_path::latest_link);
+    r.system_missing = tree.look(velm_path::system_zoneinfo, true).kind != velm_entry::directory;
     r.record = tree.read(velm_path::record, longest_text + 1);
     if (tree.look(velm_path::record).kind != velm_entry::file)
         r.record.reset();
@@ -141,7 +142,7 @@ read_state(velm_simulation& tree, velm_report& r)
     } catch (...) {
         // A tz_latest that is no link.
     }
-    r.system = facts_of(system.get(), "");
+    r.system = facts_of(r.system_missing ? nullptr : system.get(), "");
     r.live = facts_of(live.get(), r.live.root);
     r.latest = facts_of(latest.get(), r.latest.root);
     if (!system)
@@ -282,6 +283,8 @@ check_repairs(velm_simulation& tree, velm_report& r)
         // shown as such.
         if (!finding.commands && finding.manual.empty() && !finding.tries.empty())
             finding.commands = finding.tries.front();
+        if (finding.commands)
+            finding.manual.clear();
         if (!finding.commands)
             continue;
         all.insert(all.end(), finding.commands->begin(), finding.commands->end());
@@ -297,10 +300,33 @@ check_repairs(velm_simulation& tree, velm_report& r)
         r.repaired_findings.push_back(finding.id);
 }
 
+// A path a command names, as it lies inside the tree: below DIR, the shell
+// would follow an absolute link on the way out of DIR, where the boot, and
+// this report, read the tree inside it.
+static std::string
+inside(velm_simulation& tree, const std::string& path)
+{
+    size_t slash = path.rfind('/');
+    if (slash == 0 || slash == std::string::npos ||
+        tree.look(path.substr(0, slash), true).kind != velm_entry::directory)
+        return path;
+    return tree.where(path.substr(0, slash), true) + path.substr(slash);
+}
+
 velm_report
 make_report(velm_simulation& tree, const std::string& root)
 {
     velm_report r = survey(tree, root);
     check_repairs(tree, r);
+    for (velm_finding& finding : r.findings) {
+        if (root.empty() || !finding.commands)
+            continue;
+        for (velm_command& c : *finding.commands) {
+            if (c.verb != velm_command::symlink_to && c.verb != velm_command::write_word)
+                c.first = inside(tree, c.first);
+            if (!c.second.empty())
+                c.second = inside(tree, c.second);
+        }
+    }
     return r;
 }

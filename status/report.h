@@ -52,6 +52,7 @@ struct velm_report {
     std::string root; // the directory read, as the commands name it: "" for /
     velm_text zoneinfo, icutz, localtime, tz_latest, record;
     bool record_unreadable = false;
+    bool system_missing = false;      // no directory of system data to fall back on
     bool zoneinfo_understood = false; // names an update's or the system's tz database
     std::string localtime_zone;       // what follows the live tree's prefix, if anything
     velm_dataset_facts live, system, latest;

@@ -122,7 +122,8 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
         entry = entry_at(next);
         bool last = todo.empty();
         if (entry.error != 0) {
-            trouble.emplace(next, entry.error);
+            // Refused a look into a directory: the directory is what bars it.
+            trouble.emplace(entry.error == EACCES ? canonical : next, entry.error);
             return entry;
         }
         if (entry.kind == velm_entry::link && (!last || follow || must_be_directory)) {
