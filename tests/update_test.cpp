@@ -185,6 +185,23 @@ TEST_P(update_tool, row)
         try_update_faults(r.args, pristine, done);
 }
 
+// A real update, made of zone files compiled by zic and of ICU's own data,
+// is staged and booted; then real readers of each find it: date through
+// /etc/localtime, and ICU through the live icutz.
+TEST(update, real_data)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime; live_system; "
+                           "real_update_source /var/tmp/src 2025b"));
+    EXPECT_EQ(run(update("stage /var/tmp/src")).status, 0);
+    EXPECT_EQ(run(tzlinks()).status, 0);
+    EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY)).status, 0);
+    EXPECT_EQ(run("unset TZ; exec date +%Z").out, "XPT\n");
+    EXPECT_NE(run("ICU_TIMEZONE_FILES_DIR=/var/db/timezone/icutz exec icuinfo")
+                  .out.find("<param name=\"tz.version\">2025b</param>"),
+              std::string::npos);
+}
+
 // A failing row is named by its name.
 void
 PrintTo(const update_row& r, std::ostream* out)

@@ -110,24 +110,26 @@ demo_device() {
 # RELEASE with derb and genrb, packed as icutz44l.dat beside its .res files
 # (ICU's readers load those through ICU_TIMEZONE_FILES_DIR).
 real_update_source() {
-    local dir=$TREE$1 release=$2 work lib
+    local dir=$TREE$1 release=$2 work lib package
     work=$(mktemp -d)
     mkdir -p "$dir/zoneinfo" "$dir/icutz" "$work/res"
     printf 'Zone Europe/Paris 1:00 - XPT\nZone America/Los_Angeles -8:00 - XLT\n' >"$work/zones"
     zic -d "$dir/zoneinfo" "$work/zones"
     printf '%s\n' "$release" >"$dir/zoneinfo/+VERSION"
     # The library's data is one ICU data package in its read-only data:
-    # symbol address and size, section address and file offset.
+    # symbol address, size and name, section address and file offset.
     lib=$(ls /usr/lib/*-linux-gnu/libicudata.so.[0-9]* | head -n 1)
-    set -- $(nm -D -S "$lib" | awk '/ icudt[0-9]+_dat$/ { print $1, $2 }') \
+    set -- $(nm -D -S "$lib" | awk '/ icudt[0-9]+_dat$/ { print $1, $2, $4 }') \
         $(readelf -SW "$lib" | awk '{ for (i = 1; i < NF; i++) if ($i == ".rodata") print $(i + 2), $(i + 3) }')
-    tail -c +$((0x$1 - 0x$3 + 0x$4 + 1)) "$lib" | head -c $((0x$2)) >"$work/icu.dat"
-    printf '%s\n' zoneinfo64.res metaZones.res timezoneTypes.res windowsZones.res >"$work/list"
-    icupkg -d "$work/res" -x "$work/list" "$work/icu.dat"
+    package=${3%_dat}l.dat # the name its items are filed under
+    tail -c +$((0x$1 - 0x$4 + 0x$5 + 1)) "$lib" | head -c $((0x$2)) >"$work/$package"
+    printf '%s\n' zoneinfo64.res metaZones.res timezoneTypes.res windowsZones.res >"$work/list.txt"
+    (cd "$work" && icupkg -d res -x list.txt "$package")
     (cd "$work/res" && derb -c ./zoneinfo64.res 2>/dev/null) |
-        sed "s/TZVersion { \"[^\"]*\" }/TZVersion { \"$release\" }/" >"$work/zoneinfo64.txt"
+        sed -e "s/^zoneinfo64{/zoneinfo64:table(nofallback){/" \
+            -e "s/TZVersion { \"[^\"]*\" }/TZVersion { \"$release\" }/" >"$work/zoneinfo64.txt"
     genrb -q -d "$work/res" "$work/zoneinfo64.txt"
-    icupkg -tl -s "$work/res" -a "$work/list" new "$dir/icutz/icutz44l.dat"
+    (cd "$work" && icupkg -tl -s res -a list.txt new "$dir/icutz/icutz44l.dat")
     cp "$work"/res/*.res "$dir/icutz/"
     rm -rf "$work"
 }
