@@ -16,7 +16,9 @@ update. It expresses the decision only as symbolic links in
 reads time-zone data.
 
 tzlinks-status reports, without changing anything, which dataset a device
-or an image of one uses, what its next boot will do and what is wrong.")
+or an image of one uses, what its next boot will do, what is wrong and the
+commands that repair it. tzlinks-update checks, stages and prunes updates,
+judged by the boot's own code before they are placed.")
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_COMPRESSION_TYPE xz)
 set(CPACK_STRIP_FILES ON)
