@@ -42,7 +42,9 @@ velm_dataset::create_components()
     components.push_back(std::make_shared<velm_icu>(root_path));
 }
 
-bool
+// Pairwise compatible_schema over two lists, stopping at the first "no";
+// lists of different lengths are never compatible.
+static bool
 compatible_components(const velm_component_list& mine, const velm_component_list& theirs)
 {
     size_t i = 0;
@@ -65,12 +67,6 @@ velm_dataset::operator>(const velm_dataset& other) const
     return version > other.version;
 }
 
-bool
-velm_dataset::operator==(const velm_dataset& other) const
-{
-    return root_path == other.root_path;
-}
-
 void
 velm_dataset::activate() const
 {
@@ -91,15 +87,11 @@ latest_dataset_path()
     return velm_fs::read_symlink(velm_path::latest_link);
 }
 
-std::string
-current_dataset_path()
-{
-    return dataset_path_from_zoneinfo_link(velm_fs::read_symlink(velm_path::zoneinfo_link));
-}
-
-// The link points at <root>/zoneinfo for an update, so the root is all
-// before the last '/'; that '/' must leave a non-empty name after the prefix.
-std::string
+// Turns a zoneinfo link target back into a dataset root: the link points
+// at <root>/zoneinfo for an update, so the root is all before the last '/';
+// that '/' must leave a non-empty name after the prefix. Warns and throws
+// -1 for a target that names neither an update nor the system partition.
+static std::string
 dataset_path_from_zoneinfo_link(const std::string& target)
 {
     if (target.size() > update_prefix_length && has_prefix(target, update_prefix)) {
@@ -111,4 +103,10 @@ dataset_path_from_zoneinfo_link(const std::string& target)
     }
     warn("Bad zoneinfo link %s", target.c_str());
     throw -1;
+}
+
+std::string
+current_dataset_path()
+{
+    return dataset_path_from_zoneinfo_link(velm_fs::read_symlink(velm_path::zoneinfo_link));
 }

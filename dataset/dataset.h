@@ -30,8 +30,6 @@ class velm_dataset {
     bool compatible(const velm_dataset& other) const;
     // Newer by version; nothing else is compared.
     bool operator>(const velm_dataset& other) const;
-    // Same root path.
-    bool operator==(const velm_dataset& other) const;
     // Activates every component in order; the first failure propagates.
     void activate() const;
 
@@ -48,18 +46,11 @@ class velm_dataset {
     velm_component_list components; // zoneinfo, then ICU
 };
 
-// Pairwise compatible_schema over two lists, stopping at the first "no";
-// lists of different lengths are never compatible.
-bool compatible_components(const velm_component_list& mine, const velm_component_list& theirs);
-
 // Makes the system partition's dataset live.
 void force_system_dataset();
 // The root named by /var/db/timezone/zoneinfo; "" for the system partition.
 std::string current_dataset_path();
 // The target of /var/db/timezone/tz_latest, unchecked; "" when absent.
 std::string latest_dataset_path();
-// Turns a zoneinfo link target back into a dataset root. Warns and throws
-// -1 for a target that names neither an update nor the system partition.
-std::string dataset_path_from_zoneinfo_link(const std::string& target);
 
 #endif

@@ -8,7 +8,6 @@
 
 class velm_dataset_component {
   public:
-    velm_dataset_component() = default;
     explicit velm_dataset_component(const std::string& root) : root_path(root) {}
 
     // Whether this component's data can stand in for other's.

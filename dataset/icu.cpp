@@ -13,8 +13,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-velm_icu::velm_icu() : velm_icu(std::string()) {}
-
 velm_icu::velm_icu(const std::string& root)
     : velm_dataset_component(root), data_dir(root.empty() ? velm_path::system_icu : root + "/icutz")
 {

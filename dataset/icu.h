@@ -15,7 +15,6 @@ std::string velm_icu_schema_in_name(const std::string& name);
 
 class velm_icu final : public velm_dataset_component {
   public:
-    velm_icu();
     explicit velm_icu(const std::string& root);
 
     // True when other is an ICU component with the very same schema.
@@ -25,7 +24,6 @@ class velm_icu final : public velm_dataset_component {
     void activate() const override;
 
     const std::string& get_schema() const { return schema; }
-    const std::string& get_data_dir() const { return data_dir; }
 
   private:
     void initialize();

@@ -8,8 +8,6 @@
 
 #include <err.h>
 
-velm_zoneinfo::velm_zoneinfo() : velm_zoneinfo(std::string()) {}
-
 velm_zoneinfo::velm_zoneinfo(const std::string& root)
     : velm_dataset_component(root),
       data_dir(root.empty() ? velm_path::system_zoneinfo : root + "/zoneinfo")

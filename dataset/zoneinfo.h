@@ -9,7 +9,6 @@
 
 class velm_zoneinfo final : public velm_dataset_component {
   public:
-    velm_zoneinfo();
     explicit velm_zoneinfo(const std::string& root);
 
     // Any tz database can replace any other.
@@ -20,7 +19,6 @@ class velm_zoneinfo final : public velm_dataset_component {
     // First word of data_dir/+VERSION; empty when there is none. Only the
     // system partition's is kept whole.
     std::string get_version_text() const { return version_text; }
-    const std::string& get_data_dir() const { return data_dir; }
 
   private:
     void read_version();

@@ -11,6 +11,11 @@
 #include <cerrno>
 #include <err.h>
 
+// Exit status when even the last-resort reset fails and errno cannot serve
+// as the status (0, or above 255). Not an errno value on any platform this
+// tool runs on, so it is never mistaken for one.
+static const int last_resort_unknown_status = 255;
+
 // Names the last adoption: "<in use before>_<adopted>", no line end. A
 // record that cannot be written is not worth a message: the adoption itself
 // has already happened.

@@ -2,11 +2,6 @@
 #ifndef TZLINKS_DRIVER_STARTUP_H
 #define TZLINKS_DRIVER_STARTUP_H
 
-// Exit status when even the last-resort reset fails and errno cannot serve
-// as the status (0, or above 255). Not an errno value on any platform this
-// tool runs on, so it is never mistaken for one.
-const int last_resort_unknown_status = 255;
-
 // What the start-up sequence says when it sets data aside or gives up: the
 // account of its decisions that tzlinks-status reads off a simulated run.
 namespace velm_says {

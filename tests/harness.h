@@ -24,7 +24,7 @@ struct outcome {
     long max_rss;   // KiB, at most, of the program
     double seconds; // of wall time
 };
-// Runs a shell command, killed after a second (a minute under
+// Runs a shell command, killed after ten seconds (a minute under
 // $TZLINKS_RUNNER).
 outcome run(const std::string& command);
 // The command that starts a program of the project in place of the shell,
