@@ -120,7 +120,9 @@ json(const velm_dataset_facts& d, const char* extra)
 {
     if (!d.present)
         return "null";
-    std::string out = "{\"root\":" + json(d.root) + ",\"version\":" + json(d.version) +
+    // The system partition's data has no root of its own: null, not "".
+    std::string out = "{\"root\":" + json(d.root.empty() ? velm_text() : d.root) +
+                      ",\"version\":" + json(d.version) +
                       ",\"version_understood\":" + json(d.version_understood) +
                       ",\"icu_schema\":" + json(d.icu_schema) +
                       ",\"unreadable\":" + json(d.unreadable);
@@ -173,7 +175,8 @@ json_report(const velm_report& r)
     std::string remaining;
     for (const std::string& id : r.repaired_findings)
         remaining += (remaining.empty() ? "" : ",") + json(id);
-    return "{\"zoneinfo\":" + json(r.zoneinfo) + ",\"icutz\":" + json(r.icutz) +
+    return "{\"format\":" + std::to_string(report_format) + ",\"zoneinfo\":" + json(r.zoneinfo) +
+           ",\"icutz\":" + json(r.icutz) +
            ",\"localtime\":" + json(r.localtime) + ",\"tz_latest\":" + json(r.tz_latest) +
            ",\"record\":" + json(r.record) + ",\"localtime_zone\":" +
            json(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +

@@ -75,6 +75,10 @@ velm_report make_report(velm_simulation& tree, const std::string& root);
 velm_run simulate_boot(velm_simulation& tree);
 void find_problems(velm_simulation& tree, velm_report& r);
 
+// The version of the JSON report's contract (docs/status.schema.json):
+// raised whenever a change could break a reader of the one before.
+const int report_format = 1;
+
 // Texts longer than this are shown cut, the cut marked.
 const size_t longest_text = 8192;
 std::string text_report(const velm_report& report);

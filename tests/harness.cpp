@@ -101,6 +101,22 @@ run(const std::string& command)
                 static_cast<double>(end.tv_nsec - start.tv_nsec) / 1e9};
 }
 
+std::string
+schema_breaks(const std::vector<std::string>& reports)
+{
+    if (runner != nullptr || TZLINKS_SANITIZED)
+        return "";
+    std::string files;
+    for (size_t i = 0; i < reports.size(); ++i) {
+        std::string name = "/tmp/report." + std::to_string(i) + ".json";
+        std::ofstream(name) << reports[i];
+        files += " " + name;
+    }
+    return run("exec /usr/bin/python3 " TZLINKS_SOURCE_DIR "/tools/test-schema " TZLINKS_SOURCE_DIR
+               "/docs/status.schema.json" + files)
+        .out;
+}
+
 std::map<std::string, std::string>
 snapshot(bool with_times)
 {
