@@ -15,13 +15,15 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-static const char usage[] = "usage: tzlinks-status [--json | --commands] [--root DIR]\n"
-                            "       tzlinks-status --help | --version\n";
+static const char usage[] =
+    "usage: tzlinks-status [--json | --commands | --metrics[=DIR]] [--root DIR]\n"
+    "       tzlinks-status --help | --version\n";
 static const char help[] =
     "Reports which time-zone data a device uses, what its next boot will do, what\n"
     "is wrong and the commands that repair it, without changing anything.\n"
     "  --json      one JSON object instead of text\n"
     "  --commands  only the repairs' commands, a line each, to run in order as root\n"
+    "  --metrics   the report as Prometheus metrics; =DIR: into DIR/tzlinks.prom\n"
     "  --root DIR  the tree below DIR (an image, a copy) instead of the device's own\n"
     "Exit status: 0 healthy, 1 degraded, 2 broken, 64 usage, 66 DIR unreadable or\n"
     "no device tree, 74 the report could not be written. See tzlinks-status(8).\n";
@@ -62,7 +64,7 @@ main(int argc, char** argv)
     const char* root = nullptr;
     for (int i = 1; i < argc; ++i) {
         std::string word = argv[i];
-        if (word == "--json" || word == "--commands") {
+        if (word == "--json" || word == "--commands" || word.compare(0, 9, "--metrics") == 0) {
             if (form != nullptr)
                 return usage_error(word == form ? "given twice" : "given with another form", word);
             form = argv[i];
@@ -99,13 +101,16 @@ main(int argc, char** argv)
     velm_simulation tree(root_fd);
     velm_report report = make_report(tree, prefix);
     std::string form_ = form == nullptr ? "" : form;
+    // Scripts and metrics are written whatever the health: it is inside them.
+    if (form_.compare(0, 10, "--metrics=") == 0)
+        return write_metrics(form_.substr(10), metrics_report(report)) ? 0 : 74;
     (void)fputs((form_ == "--json"       ? json_report(report)
                  : form_ == "--commands" ? commands_report(report)
+                 : form_ == "--metrics"  ? metrics_report(report)
                                          : text_report(report))
                     .c_str(),
                 stdout);
-    // A script of commands is written whatever the health, which it is for.
-    if (form != nullptr && std::string(form) == "--commands")
+    if (form_ == "--commands" || form_ == "--metrics")
         return written(0);
     return written(report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2);
 }

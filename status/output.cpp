@@ -134,6 +134,12 @@ json(const velm_dataset_facts& d, const char* extra)
 }
 
 std::string
+shown(const std::string& text)
+{
+    return printable(text);
+}
+
+std::string
 json_text(const std::string& text)
 {
     return json(text);
@@ -176,9 +182,9 @@ json_report(const velm_report& r)
     for (const std::string& id : r.repaired_findings)
         remaining += (remaining.empty() ? "" : ",") + json(id);
     return "{\"format\":" + std::to_string(report_format) + ",\"zoneinfo\":" + json(r.zoneinfo) +
-           ",\"icutz\":" + json(r.icutz) +
-           ",\"localtime\":" + json(r.localtime) + ",\"tz_latest\":" + json(r.tz_latest) +
-           ",\"record\":" + json(r.record) + ",\"localtime_zone\":" +
+           ",\"icutz\":" + json(r.icutz) + ",\"localtime\":" + json(r.localtime) +
+           ",\"tz_latest\":" + json(r.tz_latest) + ",\"record\":" + json(r.record) +
+           ",\"localtime_zone\":" +
            json(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +
            ",\"live\":" + json(r.live, "live") + ",\"system\":" + json(r.system, "") +
            ",\"latest\":" + json(r.latest, "latest") + ",\"next_boot\":" + json_run(r.next_boot) +

@@ -90,6 +90,14 @@ std::string json_findings(const std::vector<velm_finding>& findings, const std::
 std::string json_run(const velm_run& run);
 std::string text_findings(const std::vector<velm_finding>& findings, const std::string& root);
 std::string text_run(const velm_run& run);
+// A text as the text report shows it: cut, and with what is no printable
+// UTF-8 escaped as \xHH.
+std::string shown(const std::string& text);
+
+// The report in Prometheus's text exposition format, and its atomic write
+// into a textfile collector's directory (warns when it fails).
+std::string metrics_report(const velm_report& report);
+bool write_metrics(const std::string& directory, const std::string& text);
 // Every finding's commands, in the report's order: a script for sh -e.
 std::string commands_report(const velm_report& report);
 

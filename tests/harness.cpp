@@ -113,7 +113,8 @@ schema_breaks(const std::vector<std::string>& reports)
         files += " " + name;
     }
     return run("exec /usr/bin/python3 " TZLINKS_SOURCE_DIR "/tools/test-schema " TZLINKS_SOURCE_DIR
-               "/docs/status.schema.json" + files)
+               "/docs/status.schema.json" +
+               files)
         .out;
 }
 

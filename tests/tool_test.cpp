@@ -7,9 +7,14 @@
 // does, as a report of the tree afterwards shows it.
 #include "harness.h"
 
+#include <arpa/inet.h>
+#include <csignal>
 #include <fstream>
 #include <gtest/gtest.h>
+#include <netinet/in.h>
 #include <regex>
+#include <sys/socket.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 namespace {
@@ -210,6 +215,61 @@ TEST(status, bounded)
         EXPECT_LT(o.out.size(), 256U * 1024) << form;
         EXPECT_NE(o.out.find("[cut]"), std::string::npos) << form;
     }
+}
+
+// One HTTP request for the metrics that node_exporter serves on port.
+std::string
+scrape(int port)
+{
+    int fd = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in to = {};
+    to.sin_family = AF_INET, to.sin_port = htons(static_cast<uint16_t>(port));
+    to.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    std::string text;
+    const char request[] = "GET /metrics HTTP/1.0\r\n\r\n";
+    if (connect(fd, reinterpret_cast<sockaddr*>(&to), sizeof to) == 0 &&
+        write(fd, request, sizeof request - 1) == sizeof request - 1) {
+        char buffer[65536];
+        for (ssize_t n; (n = read(fd, buffer, sizeof buffer)) > 0;)
+            text.append(buffer, static_cast<size_t>(n));
+    }
+    close(fd);
+    return text;
+}
+
+// Debian's node_exporter, its textfile collector pointed at what
+// --metrics=DIR wrote, serves the report: a healthy device, then the same
+// one degraded.
+TEST(status, metrics_served)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime; live_update 2024a.1.0; "
+                           "latest 2024a.1.0; mkdir /tmp/textfile"));
+    int port = 20000 + getpid() % 20000;
+    pid_t exporter = fork();
+    if (exporter == 0) {
+        execl("/usr/bin/prometheus-node-exporter", "prometheus-node-exporter",
+              ("--web.listen-address=127.0.0.1:" + std::to_string(port)).c_str(),
+              "--collector.disable-defaults", "--collector.textfile",
+              "--collector.textfile.directory=/tmp/textfile", "--log.level=error", nullptr);
+        _exit(127);
+    }
+    const std::pair<const char*, const char*> cases[] = {
+        {"", "tzlinks_health 0\n"}, {"rm /etc/localtime", "tzlinks_health 1\n"}};
+    for (const auto& [change, health] : cases) {
+        ASSERT_TRUE(build_tree(change));
+        EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY, "--metrics=/tmp/textfile")).status, 0);
+        std::string served;
+        for (int tries = 0; tries < 50 && served.empty(); ++tries, usleep(100000))
+            served = scrape(port);
+        EXPECT_NE(served.find(health), std::string::npos) << served;
+        EXPECT_NE(served.find("tzlinks_dataset_info{icu_schema=\"44l\",role=\"live\","
+                              "version=\"2024a.1.0\"} 1\n"),
+                  std::string::npos);
+        EXPECT_NE(served.find("tzlinks_next_boot_info{action=\"keep\"} 1\n"), std::string::npos);
+    }
+    kill(exporter, SIGTERM);
+    waitpid(exporter, nullptr, 0);
 }
 
 // The README's example of a report is the report of the demo's device.
