@@ -259,6 +259,8 @@ TEST(status, metrics_served)
     for (const auto& [change, health] : cases) {
         ASSERT_TRUE(build_tree(change));
         EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY, "--metrics=/tmp/textfile")).status, 0);
+        outcome lint = run("exec promtool check metrics </tmp/textfile/tzlinks.prom");
+        EXPECT_EQ(std::to_string(lint.status) + lint.out + lint.err, "0");
         std::string served;
         for (int tries = 0; tries < 50 && served.empty(); ++tries, usleep(100000))
             served = scrape(port);
