@@ -2,6 +2,7 @@
 // tzlinks-status: says which time-zone data a device (or an image of one)
 // uses, what its next boot will do, what is wrong and how to repair it;
 // changes nothing.
+#include "status/command_line.h"
 #include "status/report.h"
 
 #include <cerrno>
@@ -28,25 +29,6 @@ static const char help[] =
     "Exit status: 0 healthy, 1 degraded, 2 broken, 64 usage, 66 DIR unreadable or\n"
     "no device tree, 74 the report could not be written. See tzlinks-status(8).\n";
 
-static int
-usage_error(const char* why, const std::string& word)
-{
-    warnx("%s: %s", why, word.c_str());
-    (void)fputs(usage, stderr);
-    return 64;
-}
-
-// What was written to standard output must have got there: a report that
-// cannot be written is an error of its own.
-static int
-written(int status)
-{
-    if (fflush(stdout) == 0 && ferror(stdout) == 0)
-        return status;
-    warn("cannot write the report");
-    return 74;
-}
-
 // Whether DIR holds what a device tree holds: without var/ and usr/share/
 // the report would describe nothing but absences.
 static bool
@@ -66,11 +48,12 @@ main(int argc, char** argv)
         std::string word = argv[i];
         if (word == "--json" || word == "--commands" || word.compare(0, 9, "--metrics") == 0) {
             if (form != nullptr)
-                return usage_error(word == form ? "given twice" : "given with another form", word);
+                return usage_error(usage, word == form ? "given twice" : "given with another form",
+                                   word);
             form = argv[i];
         } else if ((word == "--root" && i + 1 < argc) || word.compare(0, 7, "--root=") == 0) {
             if (root != nullptr)
-                return usage_error("given twice", "--root");
+                return usage_error(usage, "given twice", "--root");
             root = word == "--root" ? argv[++i] : argv[i] + 7;
         } else if (word == "--help" || word == "-h") {
             (void)fputs(usage, stdout);
@@ -80,8 +63,8 @@ main(int argc, char** argv)
             (void)printf("tzlinks-status %s\n", TZLINKS_VERSION);
             return written(0);
         } else {
-            return usage_error(word == "--root" ? "missing directory after" : "unknown argument",
-                               word);
+            return usage_error(
+                usage, word == "--root" ? "missing directory after" : "unknown argument", word);
         }
     }
     int root_fd = open(root ? root : "/", O_RDONLY | O_DIRECTORY | O_CLOEXEC);

@@ -341,22 +341,31 @@ velm_simulation::unremovable(const velm_entry& entry)
 // success, whatever the lookups inside it did; on failure, the first error
 // in the kernel's own order of checks.
 
+// What the kernel checks, in its order, before it removes an entry by
+// unlink or rmdir alike: 0 when nothing stands in the way.
+int
+velm_simulation::may_remove(const char* path, std::string& canonical, velm_entry& entry)
+{
+    entry = resolve(path, false, canonical);
+    if (entry.error != 0)
+        return entry.error;
+    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+        return error;
+    if (entry.kind == velm_entry::absent)
+        return ENOENT;
+    if (int error = may_change_in(parent_of(canonical)); error != 0)
+        return error;
+    return unremovable(entry) ? EPERM : 0;
+}
+
 int
 velm_simulation::unlink(const char* path)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0)
-        return fail(entry.error);
-    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+    velm_entry entry;
+    if (int error = may_remove(path, canonical, entry); error != 0)
         return fail(error);
-    if (entry.kind == velm_entry::absent)
-        return fail(ENOENT);
-    if (int error = may_change_in(parent_of(canonical)); error != 0)
-        return fail(error);
-    if (unremovable(entry))
-        return fail(EPERM);
     if (entry.kind == velm_entry::directory)
         return fail(EISDIR);
     changed[canonical] = velm_entry();
@@ -427,17 +436,9 @@ velm_simulation::rmdir(const char* path)
 {
     int saved = errno;
     std::string canonical;
-    velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0)
-        return fail(entry.error);
-    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+    velm_entry entry;
+    if (int error = may_remove(path, canonical, entry); error != 0)
         return fail(error);
-    if (entry.kind == velm_entry::absent)
-        return fail(ENOENT);
-    if (int error = may_change_in(parent_of(canonical)); error != 0)
-        return fail(error);
-    if (unremovable(entry))
-        return fail(EPERM);
     if (entry.kind != velm_entry::directory)
         return fail(ENOTDIR);
     if (!empty_directory(canonical))

@@ -105,6 +105,7 @@ class velm_simulation final : public velm_system_calls {
     int may_change_in(const std::string& directory);
     int may_write(const velm_entry& entry, int mode);
     bool unremovable(const velm_entry& entry);
+    int may_remove(const char* path, std::string& canonical, velm_entry& entry);
     int rmdir(const char* path);
     bool empty_directory(const std::string& canonical);
     int open_for_writing(const std::string& canonical, const velm_entry& entry);

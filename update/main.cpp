@@ -3,6 +3,8 @@
 // boot's own code, and prunes the updates nothing names any more.
 #include "update/update.h"
 
+#include "status/command_line.h"
+
 #include "support/version.h"
 
 #include <cerrno>
@@ -35,23 +37,6 @@ static const char help[] =
     "  --root DIR      the device tree below DIR (an image, a copy)\n"
     "Exit status: 0 adopted, 1 adopted with warnings, 2 refused, 64 usage, 66 SRC or\n"
     "DIR unreadable, 74 a change failed, 75 locked. See tzlinks-update(8).\n";
-
-static int
-usage_error(const char* why, const std::string& word)
-{
-    warnx("%s: %s", why, word.c_str());
-    (void)fputs(usage, stderr);
-    return 64;
-}
-
-static int
-written(int status)
-{
-    if (fflush(stdout) == 0 && ferror(stdout) == 0)
-        return status;
-    warn("cannot write the report");
-    return 74;
-}
 
 // The options each command takes, and whether each takes a value.
 static const std::map<std::string, std::map<std::string, bool>> commands = {
@@ -139,7 +124,7 @@ main(int argc, char** argv)
     }
     auto options = commands.find(command);
     if (options == commands.end())
-        return usage_error(command.empty() ? "missing command" : "unknown command", command);
+        return usage_error(usage, command.empty() ? "missing command" : "unknown command", command);
     std::map<std::string, std::string> given;
     std::string source;
     for (int i = 2; i < argc; ++i) {
@@ -151,18 +136,18 @@ main(int argc, char** argv)
             return written(0);
         } else if (option != options->second.end()) {
             if (given.count(word) != 0)
-                return usage_error("given twice", word);
+                return usage_error(usage, "given twice", word);
             if (option->second && i + 1 == argc)
-                return usage_error("missing value after", word);
+                return usage_error(usage, "missing value after", word);
             given[word] = option->second ? argv[++i] : "";
         } else if (word[0] != '-' && command != "prune" && source.empty()) {
             source = word;
         } else {
-            return usage_error("unknown argument", word);
+            return usage_error(usage, "unknown argument", word);
         }
     }
     if (command != "prune" && source.empty())
-        return usage_error("missing SRC for", command);
+        return usage_error(usage, "missing SRC for", command);
     velm_device device;
     if (int status = open_device(given, device); status != 0)
         return status;
