@@ -134,8 +134,9 @@ const std::string not_utf8 =
 // \xHH in text, a quote and a backslash escaped in JSON only.
 TEST(status, command_line)
 {
-    const std::string usage = "usage: tzlinks-status [--json | --commands] [--root DIR]\n"
-                              "       tzlinks-status --help | --version\n";
+    const std::string usage =
+        "usage: tzlinks-status [--json | --commands | --metrics[=DIR]] [--root DIR]\n"
+        "       tzlinks-status --help | --version\n";
     const std::tuple<std::string, int, std::string, std::string> uses[] = {
         {"--help", 0, usage + "Reports which time-zone data a device uses", ""},
         {"-h", 0, usage + "Reports which time-zone data a device uses", ""},

@@ -202,6 +202,32 @@ TEST(update, real_data)
               std::string::npos);
 }
 
+// The command line, and the lock: a second caller waits for the first,
+// then gives up naming it.
+TEST(update, command_line)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(
+        build_tree("system_dataset 2023c 44l; live_system; update_source /var/tmp/src 2025b 44l"));
+    const std::pair<std::string, std::string> uses[] = {
+        {"", "64 tzlinks-update: missing command: \n"},
+        {"check", "64 tzlinks-update: missing SRC for: check\n"},
+        {"prune --dry-run --dry-run", "64 tzlinks-update: given twice: --dry-run\n"},
+        {"stage /var/tmp/src --wait 1",
+         "75 tzlinks-update: /var/db/timezone/.tzlinks-update.lock is held by process 4242: gave "
+         "up after 1 s\n"},
+    };
+    // The holder writes its own pid, as tzlinks-update does; 4242 stands in.
+    run("cd /var/db/timezone && echo 4242 >.tzlinks-update.lock && "
+        "{ flock .tzlinks-update.lock sleep 3 & } && sleep 0.2");
+    for (const auto& [args, expected] : uses) {
+        outcome o = run(update(args));
+        EXPECT_EQ(std::to_string(o.status) + " " + o.err.substr(0, o.err.find('\n') + 1), expected)
+            << args;
+    }
+    EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
+}
+
 // A failing row is named by its name.
 void
 PrintTo(const update_row& r, std::ostream* out)
