@@ -401,9 +401,7 @@ velm_simulation::readlink(const char* path, char* buffer, size_t size)
 }
 
 int
-velm_simulation::symlink(
-    const char* target, // NOLINT(bugprone-easily-swappable-parameters): symlink(2)'s order
-    const char* path)
+velm_simulation::symlink(const char* target, const char* path)
 {
     int saved = errno;
     if (*target == '\0')

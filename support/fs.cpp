@@ -105,9 +105,7 @@ create_symlink(const std::string& target, const std::string& link_path)
 }
 
 void
-write_own_file(const std::string&
-                   path, // NOLINT(bugprone-easily-swappable-parameters): path first, as everywhere
-               const std::string& text)
+write_own_file(const std::string& path, const std::string& text)
 {
     // Not through a link, which could aim the write at any file of the
     // system, and not into a FIFO or a device: O_NONBLOCK makes a FIFO

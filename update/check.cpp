@@ -90,7 +90,6 @@ judgement_json(const velm_judgement& j, const std::string& name, const velm_devi
     return "{\"source\":" + json_text(name) + ",\"version\":" + json_text(j.version) +
            ",\"adopts\":" + (j.adopts ? "true" : "false") +
            ",\"next_boot\":" + json_run(j.next_boot) +
-           ",\"problems\":" + json_findings(j.problems, device.root) +
-           ",\"then\":{\"health\":" + json_text(j.then.health) + ",\"warnings\":[" +
-           warned_ids(j.then, true) + "]}}\n";
+           ",\"problems\":" + json_findings(j.problems, device.root) + R"(,"then":{"health":)" +
+           json_text(j.then.health) + ",\"warnings\":[" + warned_ids(j.then, true) + "]}}\n";
 }

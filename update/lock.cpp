@@ -8,11 +8,11 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdlib>
+#include <ctime>
 #include <err.h>
 #include <fcntl.h>
 #include <string>
 #include <sys/file.h>
-#include <time.h>
 #include <unistd.h>
 
 int
@@ -35,8 +35,8 @@ take_lock(const velm_device& device, int seconds)
             char holder[32] = "";
             ssize_t n = pread(fd, holder, sizeof holder - 1, 0);
             holder[std::max(n, ssize_t(0))] = '\0';
-            warnx("%s is held by process %d: gave up after %d s", path.c_str(), atoi(holder),
-                  seconds);
+            warnx("%s is held by process %ld: gave up after %d s", path.c_str(),
+                  strtol(holder, nullptr, 10), seconds);
             return 75;
         }
         (void)nanosleep(&tenth, nullptr);

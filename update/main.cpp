@@ -39,11 +39,34 @@ static const char help[] =
     "DIR unreadable, 74 a change failed, 75 locked. See tzlinks-update(8).\n";
 
 // The options each command takes, and whether each takes a value.
-static const std::map<std::string, std::map<std::string, bool>> commands = {
-    {"check", {{"--as", true}, {"--json", false}, {"--root", true}}},
-    {"stage", {{"--as", true}, {"--force", false}, {"--wait", true}, {"--root", true}}},
-    {"prune", {{"--dry-run", false}, {"--wait", true}, {"--root", true}}},
+struct velm_option {
+    const char *command, *name;
+    bool value;
 };
+static const velm_option options[] = {
+    {"check", "--as", true},   {"check", "--json", false},    {"check", "--root", true},
+    {"stage", "--as", true},   {"stage", "--force", false},   {"stage", "--wait", true},
+    {"stage", "--root", true}, {"prune", "--dry-run", false}, {"prune", "--wait", true},
+    {"prune", "--root", true},
+};
+
+static const velm_option*
+option_of(const std::string& command, const std::string& word)
+{
+    for (const velm_option& option : options) {
+        if (command == option.command && word == option.name)
+            return &option;
+    }
+    return nullptr;
+}
+
+// How long to wait for the lock: --wait's seconds, checked when given.
+static int
+seconds_to_wait(const std::map<std::string, std::string>& given)
+{
+    auto wait = given.find("--wait");
+    return wait == given.end() ? 60 : std::stoi(wait->second);
+}
 
 static int
 open_device(const std::map<std::string, std::string>& given, velm_device& device)
@@ -81,8 +104,7 @@ check_or_stage(const std::string& command, const std::string& name,
     std::string release = source_release(src);
     std::string version = as != given.end() ? as->second : release.empty() ? "" : release + ".1.0";
     if (command == "stage") {
-        auto wait = given.find("--wait");
-        int status = take_lock(device, wait == given.end() ? 60 : atoi(wait->second.c_str()));
+        int status = take_lock(device, seconds_to_wait(given));
         if (status != 0)
             return status;
     }
@@ -122,24 +144,27 @@ main(int argc, char** argv)
             (void)fputs(help, stdout);
         return written(0);
     }
-    auto options = commands.find(command);
-    if (options == commands.end())
+    if (command != "check" && command != "stage" && command != "prune")
         return usage_error(usage, command.empty() ? "missing command" : "unknown command", command);
     std::map<std::string, std::string> given;
     std::string source;
     for (int i = 2; i < argc; ++i) {
         std::string word = argv[i];
-        auto option = options->second.find(word);
+        const velm_option* option = option_of(command, word);
         if (word == "--help" || word == "-h") {
             (void)fputs(usage, stdout);
             (void)fputs(help, stdout);
             return written(0);
-        } else if (option != options->second.end()) {
+        } else if (option != nullptr) {
             if (given.count(word) != 0)
                 return usage_error(usage, "given twice", word);
-            if (option->second && i + 1 == argc)
+            if (option->value && i + 1 == argc)
                 return usage_error(usage, "missing value after", word);
-            given[word] = option->second ? argv[++i] : "";
+            given[word] = option->value ? argv[++i] : "";
+            const std::string& value = given[word];
+            if (word == "--wait" && (value.empty() || value.size() > 5 ||
+                                     value.find_first_not_of("0123456789") != std::string::npos))
+                return usage_error(usage, "not a number of seconds", value);
         } else if (word[0] != '-' && command != "prune" && source.empty()) {
             source = word;
         } else {
@@ -153,7 +178,6 @@ main(int argc, char** argv)
         return status;
     if (command != "prune")
         return check_or_stage(command, source, given, device);
-    auto wait = given.find("--wait");
-    int status = take_lock(device, wait == given.end() ? 60 : atoi(wait->second.c_str()));
+    int status = take_lock(device, seconds_to_wait(given));
     return written(status != 0 ? status : prune(device, given.count("--dry-run") != 0));
 }

@@ -60,6 +60,15 @@ stays_inside(const std::string& target, int depth)
     return true;
 }
 
+// A link's target; "" when it cannot be read.
+std::string
+target_of(int dir, const std::string& name)
+{
+    char target[4096];
+    ssize_t n = readlinkat(dir, name.c_str(), target, sizeof target);
+    return n > 0 ? std::string(target, static_cast<size_t>(n)) : "";
+}
+
 // Walks the tree below dir (at: its path below SRC), never following a
 // link: only directories, regular files it can read and relative links
 // that stay inside SRC may be there.
@@ -81,14 +90,10 @@ walk(int dir, const std::string& at, int depth, const std::string& name,
         if (child == "." || child == "..")
             continue;
         struct stat st;
-        char target[4096];
-        ssize_t n = 0;
         int fd = -1;
         if (fstatat(dir, child.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
             why = std::string("cannot be looked at: ") + strerror(errno);
-        else if (S_ISLNK(st.st_mode) &&
-                 ((n = readlinkat(dir, child.c_str(), target, sizeof target)) < 0 ||
-                  !stays_inside(std::string(target, static_cast<size_t>(n)), depth)))
+        else if (S_ISLNK(st.st_mode) && !stays_inside(target_of(dir, child), depth))
             why = "is a link that leads out of it";
         else if (!S_ISLNK(st.st_mode) && !S_ISREG(st.st_mode) && !S_ISDIR(st.st_mode))
             why = S_ISFIFO(st.st_mode)   ? "is a FIFO"
