@@ -32,7 +32,7 @@ set(CPACK_INSTALL_PREFIX /usr)
 
 set(CPACK_TZLINKS_CXX_COMPILER ${CMAKE_CXX_COMPILER})
 set(CPACK_PROJECT_CONFIG_FILE ${CMAKE_CURRENT_LIST_DIR}/architecture.cmake)
-if(tzlinks_link MATCHES "^static(-pie)?$")
+if(tzlinks_static)
     # Nothing to depend on; but the binaries hold glibc's code, which the
     # finished package names in Built-Using.
     set(CPACK_POST_BUILD_SCRIPTS ${CMAKE_CURRENT_LIST_DIR}/built-using.cmake)

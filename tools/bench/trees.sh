@@ -1,7 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 # The device trees the benchmark runs on, built below $TREE with the
 # builders of tools/sample-tree.sh (source that first). Each is a state a
-# device is really found in at boot.
+# device is really found in.
 
 # A device on the update 2024a.1.0 with localtime set.
 on_update_2024a() {
@@ -33,9 +33,15 @@ reset_tree() {
     put_link /usr/share/zoneinfo /var/db/timezone/zoneinfo
 }
 
-# The update in use, no tz_latest: one ICU walk, over N files that are not
-# ICU data besides the one that is.
-walk_tree() {
-    on_update_2024a
-    (cd "$TREE/var/db/timezone/tz/2024a.1.0/icutz" && seq -f 'zone%06g.res' "$1" | xargs touch)
+# A device on its system data, where an update is staged.
+staging_tree() {
+    system_dataset 2023c 44l
+    live_system
+}
+
+# The same with the update SRC left below tz/ and named by nothing: what
+# prune removes.
+superseded_tree() { # SRC
+    staging_tree
+    cp -a "$1" "$TREE$tz/tz/2025a.1.0"
 }
