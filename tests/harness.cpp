@@ -35,11 +35,12 @@ fresh_tree()
     std::getline(std::ifstream("/proc/self/uid_map"), map);
     if (map.find("4294967295") != std::string::npos)
         return false;
-    if (!etc && (mount("tzlinks-test", "/tmp", "tmpfs", MS_NOSUID | MS_NODEV, "mode=1777") != 0 ||
-                 mkdir("/tmp/.etc", 0700) != 0 || mkdir("/tmp/.etc/upper", 0755) != 0 ||
-                 mkdir("/tmp/.etc/work", 0700) != 0 ||
-                 mount("tzlinks-test", "/etc", "overlay", MS_NOSUID | MS_NODEV,
-                       "lowerdir=/etc,upperdir=/tmp/.etc/upper,workdir=/tmp/.etc/work") != 0))
+    if (!etc &&
+        (mount("tzlinks-test", "/dev/shm", "tmpfs", MS_NOSUID | MS_NODEV, "mode=1777") != 0 ||
+         mkdir("/dev/shm/.etc", 0700) != 0 || mkdir("/dev/shm/.etc/upper", 0755) != 0 ||
+         mkdir("/dev/shm/.etc/work", 0700) != 0 ||
+         mount("tzlinks-test", "/etc", "overlay", MS_NOSUID | MS_NODEV,
+               "lowerdir=/etc,upperdir=/dev/shm/.etc/upper,workdir=/dev/shm/.etc/work") != 0))
         return false;
     etc = true;
     return mount("tzlinks-test", "/var", "tmpfs", MS_NOSUID | MS_NODEV, "mode=0755") == 0 &&
@@ -108,7 +109,7 @@ schema_breaks(const std::vector<std::string>& reports)
         return "";
     std::string files;
     for (size_t i = 0; i < reports.size(); ++i) {
-        std::string name = "/tmp/report." + std::to_string(i) + ".json";
+        std::string name = "/dev/shm/report." + std::to_string(i) + ".json";
         std::ofstream(name) << reports[i];
         files += " " + name;
     }

@@ -11,8 +11,9 @@
 #include <string>
 #include <vector>
 
-// Puts empty file systems over /var, /usr/share and /tmp, and one over /etc
-// that keeps the host's files but none of the changes; false when refused,
+// Puts empty file systems over /var, /usr/share and /dev/shm (the tests'
+// scratch), and one over /etc that keeps the host's files but none of the
+// changes; false when refused,
 // and always outside a user namespace of the tests' own.
 bool fresh_tree();
 // Runs the sample-tree builders (tools/sample-tree.sh) on the fixed paths.

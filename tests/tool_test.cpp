@@ -245,22 +245,22 @@ TEST(status, metrics_served)
 {
     ASSERT_TRUE(fresh_tree());
     ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime; live_update 2024a.1.0; "
-                           "latest 2024a.1.0; mkdir /tmp/textfile"));
+                           "latest 2024a.1.0; mkdir /dev/shm/textfile"));
     int port = 20000 + getpid() % 20000;
     pid_t exporter = fork();
     if (exporter == 0) {
         execl("/usr/bin/prometheus-node-exporter", "prometheus-node-exporter",
               ("--web.listen-address=127.0.0.1:" + std::to_string(port)).c_str(),
               "--collector.disable-defaults", "--collector.textfile",
-              "--collector.textfile.directory=/tmp/textfile", "--log.level=error", nullptr);
+              "--collector.textfile.directory=/dev/shm/textfile", "--log.level=error", nullptr);
         _exit(127);
     }
     const std::pair<const char*, const char*> cases[] = {
         {"", "tzlinks_health 0\n"}, {"rm /etc/localtime", "tzlinks_health 1\n"}};
     for (const auto& [change, health] : cases) {
         ASSERT_TRUE(build_tree(change));
-        EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY, "--metrics=/tmp/textfile")).status, 0);
-        outcome lint = run("exec promtool check metrics </tmp/textfile/tzlinks.prom");
+        EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY, "--metrics=/dev/shm/textfile")).status, 0);
+        outcome lint = run("exec promtool check metrics </dev/shm/textfile/tzlinks.prom");
         EXPECT_EQ(std::to_string(lint.status) + lint.out + lint.err, "0");
         std::string served;
         for (int tries = 0; tries < 50 && served.empty(); ++tries, usleep(100000))
