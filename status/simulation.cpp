@@ -39,8 +39,21 @@ velm_simulation::~velm_simulation()
     reset();
 }
 
+// The real tree never changes under a report, so each entry is looked at
+// once: a report looks at the same few paths over and over.
 velm_entry
 velm_simulation::real_entry(int base, const std::string& real)
+{
+    auto known = looked.find({base, real});
+    if (known != looked.end())
+        return known->second;
+    velm_entry entry = look_up(base, real);
+    looked.emplace(std::make_pair(base, real), entry);
+    return entry;
+}
+
+velm_entry
+velm_simulation::look_up(int base, const std::string& real)
 {
     velm_entry entry;
     entry.base = base, entry.real = real;

@@ -100,6 +100,7 @@ class velm_simulation final : public velm_system_calls {
 
   private:
     velm_entry real_entry(int base, const std::string& real);
+    velm_entry look_up(int base, const std::string& real);
     velm_entry entry_at(const std::string& canonical);
     velm_entry resolve(const std::string& path, bool follow, std::string& canonical);
     int may_change_in(const std::string& directory);
@@ -119,6 +120,7 @@ class velm_simulation final : public velm_system_calls {
     std::set<std::string> writes;
     std::vector<std::pair<int, std::string>> pending; // files open for writing
     std::map<std::string, int> trouble;
+    std::map<std::pair<int, std::string>, velm_entry> looked; // real entries, as looked up
 };
 
 #endif

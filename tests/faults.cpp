@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The fault and power-cut mode: with TZLINKS_FAULTS set, every end-to-end
-// row also runs tzlinks again and again from its tree, with strace failing
+// row marked faults also runs tzlinks again and again from its tree, with strace failing
 // each call it makes on the file system in turn (once; a change of the
 // tree also from then on, as on a file system turning read-only), and
 // killing it on entry to each call that changes the tree. Each run must

@@ -185,7 +185,7 @@ parse(const std::string& line)
         else if (option.compare(0, 5, "caps=") == 0)
             r.caps = option.substr(5);
         else
-            r.local = option == "local";
+            (option == "local" ? r.local : r.faults) = true;
     }
     r.tree = fields.at(1);
     for (std::string word; words >> word;) {

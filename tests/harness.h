@@ -52,7 +52,8 @@ struct row {
     std::string name, inject, caps, tree, health, err; // err: as warn(3) writes it
     std::vector<std::string> changes;
     int exit = 0;
-    bool local = false; // a tree no copy can stand for (its mounts)
+    bool local = false;  // a tree no copy can stand for (its mounts)
+    bool faults = false; // run in the fault and power-cut mode too
 };
 std::vector<row> load_rows();
 // The fault and power-cut runs of a row, from its tree kept at pristine.
