@@ -63,7 +63,7 @@ prune(const velm_device& device, bool dry_run)
         if (!S_ISDIR(st.st_mode) && !named.count(name)) {
             (void)printf("Left %s: it is no directory\n", path.c_str());
         } else if (S_ISDIR(st.st_mode) && (leftover || !named.count(name))) {
-            if (!dry_run && !remove_tree(updates, name)) {
+            if (!dry_run && !remove_all(updates, name)) {
                 warn("cannot remove %s", path.c_str());
                 status = 74;
                 continue;

@@ -45,7 +45,7 @@ place(const velm_device& device, int updates, int src, const std::string& versio
 {
     std::string staging = staging_directory(updates, version);
     int to = staging.empty() ? -1 : openat(updates, staging.c_str(), directory_flags);
-    bool placed = to >= 0 && copy_tree(src, to);
+    bool placed = to >= 0 && copy_into(src, to);
     struct stat st;
     placed = placed && fstat(src, &st) == 0 && fchmod(to, st.st_mode & 0777) == 0 &&
              syncfs(to) == 0 &&
@@ -57,7 +57,7 @@ place(const velm_device& device, int updates, int src, const std::string& versio
         (void)close(to);
     // What is left of a failed copy goes now, or with the next prune.
     if (!placed && !staging.empty())
-        (void)remove_tree(updates, staging);
+        (void)remove_all(updates, staging);
     return placed ? 0 : 74;
 }
 
@@ -89,7 +89,7 @@ stage(const velm_device& device, int src, const std::string& version)
     int updates = openat(links, "tz", directory_flags);
     int existing = updates < 0 ? -1 : openat(updates, version.c_str(), directory_flags);
     int status = updates < 0 ? 74 : 0;
-    if (status == 0 && existing >= 0 && !same_tree(src, existing)) {
+    if (status == 0 && existing >= 0 && !same_content(src, existing)) {
         warnx("%s holds another update already: pick another version with --as",
               device.at(velm_path::updates + version).c_str());
         status = 2;

@@ -55,7 +55,7 @@ copy_file(int from, const char* name, int to, mode_t mode)
 }
 
 bool
-copy_tree(int from, int to)
+copy_into(int from, int to)
 {
     for (const std::string& name : names_in(from)) {
         struct stat st;
@@ -65,7 +65,7 @@ copy_tree(int from, int to)
             int in = -1, out = -1;
             copied = mkdirat(to, name.c_str(), 0700) == 0 &&
                      (in = openat(from, name.c_str(), directory_flags)) >= 0 &&
-                     (out = openat(to, name.c_str(), directory_flags)) >= 0 && copy_tree(in, out) &&
+                     (out = openat(to, name.c_str(), directory_flags)) >= 0 && copy_into(in, out) &&
                      fchmod(out, st.st_mode & 0777) == 0;
             for (int fd : {in, out}) {
                 if (fd >= 0)
@@ -104,7 +104,7 @@ same_file(int a, int b)
 }
 
 bool
-same_tree(int a, int b)
+same_content(int a, int b)
 {
     std::vector<std::string> names = names_in(a), others = names_in(b);
     if (std::set<std::string>(names.begin(), names.end()) !=
@@ -126,7 +126,7 @@ same_tree(int a, int b)
         } else {
             int fa = openat(a, name.c_str(), flags), fb = openat(b, name.c_str(), flags);
             same =
-                fa >= 0 && fb >= 0 && (S_ISDIR(x.st_mode) ? same_tree(fa, fb) : same_file(fa, fb));
+                fa >= 0 && fb >= 0 && (S_ISDIR(x.st_mode) ? same_content(fa, fb) : same_file(fa, fb));
             for (int fd : {fa, fb}) {
                 if (fd >= 0)
                     (void)close(fd);
@@ -139,7 +139,7 @@ same_tree(int a, int b)
 }
 
 bool
-remove_tree(int dir, const std::string& name)
+remove_all(int dir, const std::string& name)
 {
     struct stat st;
     if (fstatat(dir, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
@@ -149,7 +149,7 @@ remove_tree(int dir, const std::string& name)
     int fd = openat(dir, name.c_str(), directory_flags);
     bool removed = fd >= 0;
     for (const std::string& child : removed ? names_in(fd) : std::vector<std::string>())
-        removed = remove_tree(fd, child) && removed;
+        removed = remove_all(fd, child) && removed;
     if (fd >= 0)
         (void)close(fd);
     return removed && (unlinkat(dir, name.c_str(), AT_REMOVEDIR) == 0 || errno == ENOENT);

@@ -10,10 +10,10 @@ std::vector<std::string> names_in(int dir);
 // Copies what is below from into the empty directory to: directories,
 // regular files with their permission bits, and links as they are. Warns
 // and stops at the first failure.
-bool copy_tree(int from, int to);
+bool copy_into(int from, int to);
 // Whether two trees hold the same names, kinds, bytes and link targets.
-bool same_tree(int a, int b);
+bool same_content(int a, int b);
 // Removes name below dir, and everything below it; true when it is gone.
-bool remove_tree(int dir, const std::string& name);
+bool remove_all(int dir, const std::string& name);
 
 #endif
