@@ -18,8 +18,9 @@ velm_zoneinfo::velm_zoneinfo(const std::string& root)
 void
 velm_zoneinfo::read_version()
 {
-    // Only the system partition's version is ever used: an update's is not
-    // held, however long, only opened and read into as the boot always has.
+    // Only the system partition's version is ever used: an update's is
+    // opened and read into, for what errno then says in the messages that
+    // follow, but not held, however long it is.
     read_first_word(data_dir + "/+VERSION", version_text,
                     root_path.empty() ? std::string::npos : 0);
 }
