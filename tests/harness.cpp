@@ -170,7 +170,7 @@ message(const std::string& field)
 }
 
 static row
-parse(const std::string& line)
+parse(const std::string& line, bool tzlinks)
 {
     std::vector<std::string> fields;
     std::istringstream split(line);
@@ -179,6 +179,9 @@ parse(const std::string& line)
     row r;
     std::istringstream head(fields.at(0)), words(fields.at(2));
     head >> r.name;
+    if (!tzlinks) // tests/update.rows: arguments, then what comes of them
+        r.args = fields.at(2),
+        r.expect = fields.at(3).substr(0, fields[3].find_last_not_of(' ') + 1);
     for (std::string option; head >> option;) {
         if (option.compare(0, 7, "inject=") == 0)
             r.inject = option.substr(7);
@@ -188,7 +191,7 @@ parse(const std::string& line)
             (option == "local" ? r.local : r.faults) = true;
     }
     r.tree = fields.at(1);
-    for (std::string word; words >> word;) {
+    for (std::string word; tzlinks && words >> word;) {
         if (word.compare(0, 5, "exit=") == 0)
             r.exit = std::stoi(word.substr(5));
         else if (word.find_first_of("=>/") == std::string::npos && word[0] != '-')
@@ -202,10 +205,16 @@ parse(const std::string& line)
     return r;
 }
 
-std::vector<row>
-load_rows()
+void
+PrintTo(const row& r, std::ostream* out)
 {
-    std::ifstream in(TZLINKS_SOURCE_DIR "/tests/tool.rows");
+    *out << r.name;
+}
+
+std::vector<row>
+load_rows(const std::string& table)
+{
+    std::ifstream in(TZLINKS_SOURCE_DIR "/tests/" + table);
     std::map<std::string, std::string> named = {{"@", live_dir + "tz/"}};
     std::vector<std::string> lines;
     for (std::string line; std::getline(in, line);) {
@@ -222,7 +231,7 @@ load_rows()
     }
     std::vector<row> rows;
     for (const std::string& line : lines)
-        rows.push_back(parse(line));
+        rows.push_back(parse(line, table == "tool.rows"));
     return rows;
 }
 

@@ -8,6 +8,7 @@
 #define TZLINKS_TESTS_HARNESS_H
 
 #include <map>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -50,12 +51,16 @@ std::map<std::string, std::string> snapshot(bool with_times = false);
 
 struct row {
     std::string name, inject, caps, tree, health, err; // err: as warn(3) writes it
+    std::string args, expect;                          // of tzlinks-update
     std::vector<std::string> changes;
     int exit = 0;
     bool local = false;  // a tree no copy can stand for (its mounts)
     bool faults = false; // run in the fault and power-cut mode too
 };
-std::vector<row> load_rows();
+// A failing row is named by its name.
+void PrintTo(const row& r, std::ostream* out);
+// The rows of tests/TABLE: tool.rows, or update.rows.
+std::vector<row> load_rows(const std::string& table);
 // The fault and power-cut runs of a row, from its tree kept at pristine.
 void try_faults(const std::string& pristine);
 // The calls a trace (strace -f -o) holds from the first that names

@@ -15,46 +15,6 @@
 
 namespace {
 
-struct update_row {
-    std::string name, caps, tree, args, expect;
-    bool faults = false;
-};
-
-std::vector<update_row>
-load()
-{
-    std::ifstream in(TZLINKS_SOURCE_DIR "/tests/update.rows");
-    std::vector<std::string> lines;
-    for (std::string line; std::getline(in, line);) {
-        for (size_t at; (at = line.find('@')) != std::string::npos;)
-            line.replace(at, 1, "/var/db/timezone/tz/");
-        if (line[0] == ' ')
-            lines.back() += line;
-        else if (!line.empty() && line[0] != '#')
-            lines.push_back(line);
-    }
-    std::vector<update_row> rows;
-    for (const std::string& line : lines) {
-        std::vector<std::string> f;
-        std::istringstream split(line);
-        for (std::string field; std::getline(split, field, '|');)
-            f.push_back(
-                field.substr(field.find_first_not_of(' '),
-                             field.find_last_not_of(' ') + 1 - field.find_first_not_of(' ')));
-        std::istringstream head(f.at(0));
-        update_row r;
-        head >> r.name;
-        for (std::string option; head >> option;) {
-            if (option.compare(0, 5, "caps=") == 0)
-                r.caps = option.substr(5);
-            r.faults = r.faults || option == "faults";
-        }
-        r.tree = f.at(1), r.args = f.at(2), r.expect = f.at(3);
-        rows.push_back(r);
-    }
-    return rows;
-}
-
 std::string
 update(const std::string& args)
 {
@@ -70,6 +30,7 @@ state()
            " tz=" + run("ls -A /var/db/timezone/tz | paste -sd, | tr -d '\\n'").out;
 }
 
+// Of a state, what tz_latest names.
 std::string
 latest_of(const std::string& state)
 {
@@ -138,11 +99,11 @@ try_update_faults(const std::string& args, const std::string& pristine, const st
     std::cout << "UPDATE FAULTS injected " << injected << " cuts " << cuts << "\n";
 }
 
-class update_tool : public ::testing::TestWithParam<update_row> {};
+class update_tool : public ::testing::TestWithParam<row> {};
 
 TEST_P(update_tool, row)
 {
-    const update_row& r = GetParam();
+    const row& r = GetParam();
     if (getenv("TZLINKS_FAULTS") != nullptr && !r.faults)
         GTEST_SKIP() << "not a row of the fault mode";
     drop_capabilities(r.caps);
@@ -230,14 +191,7 @@ TEST(update, command_line)
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
 }
 
-// A failing row is named by its name.
-void
-PrintTo(const update_row& r, std::ostream* out)
-{
-    *out << r.name;
-}
-
-INSTANTIATE_TEST_SUITE_P(tzlinks_update, update_tool, ::testing::ValuesIn(load()),
+INSTANTIATE_TEST_SUITE_P(tzlinks_update, update_tool, ::testing::ValuesIn(load_rows("update.rows")),
                          [](const auto& each) { return each.param.name; });
 
 } // namespace
