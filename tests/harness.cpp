@@ -205,6 +205,13 @@ parse(const std::string& line, bool tzlinks)
     return r;
 }
 
+bool
+set_up(const row& r)
+{
+    drop_capabilities(r.caps);
+    return fresh_tree() && build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree);
+}
+
 void
 PrintTo(const row& r, std::ostream* out)
 {

@@ -59,6 +59,9 @@ struct row {
 };
 // A failing row is named by its name.
 void PrintTo(const row& r, std::ostream* out);
+// A row's device: a fresh tree with the system data 2023c, /etc/localtime
+// through the boot's link, and what the row builds; its capabilities set.
+bool set_up(const row& r);
 // The rows of tests/TABLE: tool.rows, or update.rows.
 std::vector<row> load_rows(const std::string& table);
 // The fault and power-cut runs of a row, from its tree kept at pristine.

@@ -31,9 +31,7 @@ TEST_P(tool, row)
     const row& r = GetParam();
     if (getenv("TZLINKS_FAULTS") != nullptr && !r.faults)
         GTEST_SKIP() << "not a row of the fault mode";
-    drop_capabilities(r.caps);
-    ASSERT_TRUE(fresh_tree());
-    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree)) << r.tree;
+    ASSERT_TRUE(set_up(r)) << r.tree;
     auto before = snapshot(true), plain_before = snapshot();
     std::string report = run(program(TZLINKS_STATUS_BINARY, "--json")).out;
     EXPECT_EQ(snapshot(true), before) << "tzlinks-status changed the tree";

@@ -106,9 +106,7 @@ TEST_P(update_tool, row)
     const row& r = GetParam();
     if (getenv("TZLINKS_FAULTS") != nullptr && !r.faults)
         GTEST_SKIP() << "not a row of the fault mode";
-    drop_capabilities(r.caps);
-    ASSERT_TRUE(fresh_tree());
-    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree)) << r.tree;
+    ASSERT_TRUE(set_up(r)) << r.tree;
     bool checking = r.args.compare(0, 5, "check") == 0,
          staging = r.args.compare(0, 5, "stage") == 0;
     std::string source = std::regex_replace(r.args, std::regex("^stage|--force|--wait [0-9]+"), "");
