@@ -30,7 +30,7 @@ velm_dataset::create_components()
     // the system dataset takes its version from it.
     auto zoneinfo = std::make_shared<velm_zoneinfo>(root_path);
     if (root_path.empty()) {
-        version_string = zoneinfo->get_version_text() + ".1.0";
+        version_string = velm_release_version(zoneinfo->get_version_text());
     } else if (root_path.size() > update_prefix_length && has_prefix(root_path, update_prefix)) {
         version_string = root_path.substr(update_prefix_length);
     } else {
@@ -72,6 +72,12 @@ velm_dataset::activate() const
 {
     for (const auto& component : components)
         component->activate();
+}
+
+std::string
+velm_release_version(const std::string& release)
+{
+    return release + ".1.0";
 }
 
 void

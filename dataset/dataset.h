@@ -34,6 +34,7 @@ class velm_dataset {
     void activate() const;
 
     std::string get_version_string() const { return version_string; }
+    const std::string& get_root() const { return root_path; }
     const velm_version& get_version() const { return version; }
     const velm_component_list& get_components() const { return components; }
 
@@ -45,6 +46,11 @@ class velm_dataset {
     std::string root_path;
     velm_component_list components; // zoneinfo, then ICU
 };
+
+// The version string a tz release takes as a dataset: 2023c gives
+// 2023c.1.0. The system partition's data is named so, and so is an update
+// staged from a release.
+std::string velm_release_version(const std::string& release);
 
 // Makes the system partition's dataset live.
 void force_system_dataset();

@@ -3,6 +3,7 @@
 
 #include "support/fs.h"
 
+#include <cerrno>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -13,6 +14,24 @@ static bool
 is_space(char c)
 {
     return c == ' ' || (c >= '\t' && c <= '\r');
+}
+
+int
+first_word_of(int fd, std::string& word, size_t keep)
+{
+    bool more = true;
+    char buffer[4096];
+    ssize_t n = 0;
+    while (more && (n = read(fd, buffer, sizeof buffer)) > 0) {
+        for (ssize_t i = 0; more && i < n; ++i) {
+            if (!is_space(buffer[i]))
+                word += buffer[i];
+            else
+                more = word.empty();
+            more = more && word.size() <= keep;
+        }
+    }
+    return n < 0 ? errno : 0;
 }
 
 void
@@ -27,17 +46,11 @@ read_first_word(const std::string& path, std::string& target, size_t keep)
     // is what errno says in the messages that follow.
     struct stat st;
     std::string word;
-    bool more = fstat(fd, &st) == 0 && (S_ISREG(st.st_mode) || S_ISDIR(st.st_mode));
-    char buffer[4096];
-    for (ssize_t n = 0; more && (n = read(fd, buffer, sizeof buffer)) > 0;) {
-        for (ssize_t i = 0; more && i < n; ++i) {
-            if (!is_space(buffer[i]))
-                word += buffer[i];
-            else
-                more = word.empty();
-            more = more && word.size() <= keep;
-        }
-    }
+    int error = fstat(fd, &st) != 0 ? errno
+                : S_ISREG(st.st_mode) || S_ISDIR(st.st_mode) ? first_word_of(fd, word, keep)
+                                                              : 0;
+    if (error != 0 && error != EISDIR)
+        system_calls().io_failed(path, error);
     (void)close(fd);
     if (!word.empty())
         target = word;

@@ -11,4 +11,8 @@
 // bytes, and so does the word: a word nobody uses need not be held whole.
 void read_first_word(const std::string& path, std::string& target, size_t keep = std::string::npos);
 
+// The same word, read from the descriptor fd (a regular file's): 0, or the
+// errno of a read that failed, when the word may be cut short.
+int first_word_of(int fd, std::string& word, size_t keep = std::string::npos);
+
 #endif

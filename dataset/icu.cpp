@@ -46,22 +46,38 @@ velm_icu_schema_in_name(const std::string& name)
 // counts; links, directories and whatever lies deeper do not. The first
 // match in directory order wins.
 static std::string
-first_schema_in(int directory)
+first_data_file_in(int directory, const std::string& path)
 {
     alignas(struct dirent64) char buffer[8192];
-    for (ssize_t n; (n = getdents64(directory, buffer, sizeof buffer)) > 0;) {
+    ssize_t n;
+    while ((n = getdents64(directory, buffer, sizeof buffer)) > 0) {
         for (ssize_t at = 0; at < n;) {
             const auto* entry = reinterpret_cast<const struct dirent64*>(buffer + at);
             at += entry->d_reclen;
-            std::string schema = velm_icu_schema_in_name(entry->d_name);
             struct stat st;
-            if (!schema.empty() &&
-                fstatat(directory, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) == 0 &&
-                S_ISREG(st.st_mode) && (st.st_mode & S_IROTH) != 0)
-                return schema;
+            if (velm_icu_schema_in_name(entry->d_name).empty())
+                continue;
+            if (fstatat(directory, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) != 0)
+                system_calls().io_failed(path + "/" + entry->d_name, errno);
+            else if (S_ISREG(st.st_mode) && (st.st_mode & S_IROTH) != 0)
+                return entry->d_name;
         }
     }
+    if (n < 0)
+        system_calls().io_failed(path, errno);
     return std::string();
+}
+
+std::string
+velm_icu_data_file(const std::string& directory)
+{
+    int fd =
+        system_calls().open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC);
+    if (fd < 0)
+        return std::string();
+    std::string name = first_data_file_in(fd, directory);
+    (void)close(fd);
+    return name;
 }
 
 // An update's schema is spelled in the name of its data file, for example
@@ -69,12 +85,7 @@ first_schema_in(int directory)
 void
 velm_icu::find_update_schema()
 {
-    int directory =
-        system_calls().open(data_dir.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC);
-    if (directory >= 0) {
-        schema = first_schema_in(directory);
-        (void)close(directory);
-    }
+    schema = velm_icu_schema_in_name(velm_icu_data_file(data_dir));
     if (schema.empty()) {
         // A walk that finds nothing ends with errno at 0: this warning,
         // and those after it that follow no failed call, carry that text.

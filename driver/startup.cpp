@@ -28,12 +28,14 @@ write_version_diff_record(const std::string& before, const std::string& adopted)
 // Reads the zoneinfo link; a link that is missing or not understood puts
 // the system partition's data in place and is treated as naming it.
 static std::string
-read_current_path()
+read_current_path(velm_startup_watcher* watcher)
 {
     try {
         return current_dataset_path();
     } catch (...) {
-        warn("%s", velm_says::invalid_current);
+        warn("Invalid current symlinks; resetting to system partition");
+        if (watcher != nullptr)
+            watcher->not_understood();
         force_system_dataset();
         return std::string();
     }
@@ -42,16 +44,20 @@ read_current_path()
 // Checks the dataset in use against the system partition's and adopts the
 // newest update when it fits. Any failure escapes to the caller.
 static void
-decide()
+decide(velm_startup_watcher* watcher)
 {
     velm_dataset system;
     std::string latest_path = latest_dataset_path();
-    std::string current_path = read_current_path();
+    std::string current_path = read_current_path(watcher);
 
     velm_dataset current(current_path);
     const velm_dataset* in_use = &current;
-    if (!current.compatible(system) || system > current) {
-        warn("%s", velm_says::incompatible);
+    bool compatible = current.compatible(system), older = system > current;
+    bool kept = compatible && !older;
+    if (watcher != nullptr)
+        watcher->current(current, system, compatible, older, kept);
+    if (!kept) {
+        warn("Symlink points at data incompatible with installed system");
         force_system_dataset();
         in_use = &system;
     }
@@ -61,30 +67,37 @@ decide()
     // Compared with the current dataset even when that was just rejected:
     // an update newer than it but older than the system data still wins.
     velm_dataset latest(latest_path);
-    if (latest.compatible(system) && latest > current) {
+    compatible = latest.compatible(system);
+    bool newer = latest > current, adopted = compatible && newer;
+    if (watcher != nullptr)
+        watcher->latest(latest, system, compatible, newer, adopted);
+    if (adopted) {
         latest.activate();
         write_version_diff_record(in_use->get_version_string(), latest.get_version_string());
     } else {
-        warn("%s: %s vs. %s", velm_says::refused, latest.get_version_string().c_str(),
+        warn("New update not compatible or older version: %s vs. %s",
+             latest.get_version_string().c_str(),
              current.get_version_string().c_str());
     }
 }
 
 int
-run_startup_sequence()
+run_startup_sequence(velm_startup_watcher* watcher)
 {
     protect_data_directories();
     migrate_icu_link();
     (void)system_calls().remove(velm_path::legacy_icu);
 
     try {
-        decide();
+        decide(watcher);
     } catch (...) {
-        warn("%s", velm_says::unable);
+        warn("Unable to locate data; resetting to system partition");
+        if (watcher != nullptr)
+            watcher->abandoned();
         try {
             force_system_dataset();
         } catch (...) {
-            warn("%s", velm_says::last_resort);
+            warn("Last resort force_system_dataset() failed");
             // Without working links there is nothing sensible left to do,
             // not even the localtime repair; errno is the only account of
             // why.

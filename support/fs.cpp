@@ -104,6 +104,21 @@ create_symlink(const std::string& target, const std::string& link_path)
     throw errno;
 }
 
+int
+read_link_at(int dir, const std::string& name, std::string& target)
+{
+    for (size_t size = 256;; size *= 4) {
+        target.resize(size);
+        ssize_t n = readlinkat(dir, name.c_str(), target.data(), size);
+        if (n < 0)
+            return errno;
+        if (static_cast<size_t>(n) < size) {
+            target.resize(static_cast<size_t>(n));
+            return 0;
+        }
+    }
+}
+
 void
 write_own_file(const std::string& path, const std::string& text)
 {
@@ -119,9 +134,12 @@ write_own_file(const std::string& path, const std::string& text)
     if (fd < 0)
         return;
     struct stat st;
-    if (fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_nlink <= 1 &&
-        (st.st_size == 0 || ftruncate(fd, 0) == 0))
-        (void)::write(fd, text.data(), text.size());
+    bool done = fstat(fd, &st) == 0;
+    if (done && S_ISREG(st.st_mode) && st.st_nlink <= 1)
+        done = (st.st_size == 0 || ftruncate(fd, 0) == 0) &&
+               ::write(fd, text.data(), text.size()) == static_cast<ssize_t>(text.size());
+    if (!done)
+        system_calls().io_failed(path, errno);
     (void)::close(fd);
 }
 

@@ -31,6 +31,11 @@ class velm_system_calls {
     virtual int symlink(const char* target, const char* path);
     virtual int remove(const char* path); // remove(3): a file, a link or an empty directory
     virtual int open(const char* path, int flags, mode_t mode = 0);
+    // Told of a call on a descriptor that failed (a listing, a file's
+    // bytes read or written, fstat): the boot goes on as if there were
+    // nothing there, but a watcher must not take that for an absence.
+    // Nothing, for real.
+    virtual void io_failed(const std::string& /*path*/, int /*error*/) {}
 };
 
 // The calls in use: the real ones, but while a velm_calls_in_use lives.
@@ -66,6 +71,11 @@ std::string read_symlink(const std::string& path);
 
 // symlink(2), target first as in the system call. Never replaces an entry.
 void create_symlink(const std::string& target, const std::string& link_path);
+
+// The whole target of the link name below the directory dir, however long
+// (readlinkat(2), read again into a larger buffer until it fits): 0, or the
+// errno of the failed call. Never warns.
+int read_link_at(int dir, const std::string& name, std::string& target);
 
 // Replaces the content of the regular file at path, created when missing,
 // and leaves anything else there alone: a link (not followed), a FIFO, a
