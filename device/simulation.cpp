@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "status/simulation.h"
+#include "device/simulation.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -62,11 +62,8 @@ velm_simulation::look_up(int base, const std::string& real)
         entry.error = errno == ENOENT ? 0 : errno;
         return entry;
     }
-    if (S_ISLNK(st.st_mode)) {
-        std::string target(static_cast<size_t>(st.st_size) + 4096, '\0');
-        ssize_t n = readlinkat(base, relative(real).c_str(), target.data(), target.size());
-        entry.text = target.substr(0, static_cast<size_t>(std::max(n, ssize_t(0))));
-    }
+    if (S_ISLNK(st.st_mode))
+        entry.error = velm_fs::read_link_at(base, relative(real), entry.text);
     entry.shared = S_ISREG(st.st_mode) && st.st_nlink > 1;
     entry.mode = st.st_mode & 07777;
     entry.kind = S_ISLNK(st.st_mode)    ? velm_entry::link
@@ -161,11 +158,13 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
 }
 
 velm_entry
-velm_simulation::look(const std::string& path, bool follow)
+velm_simulation::look(const std::string& path, bool follow, std::string* canonical)
 {
     int saved = errno;
-    std::string canonical;
-    velm_entry entry = resolve(path, follow, canonical);
+    std::string where;
+    velm_entry entry = resolve(path, follow, where);
+    if (canonical != nullptr)
+        *canonical = where;
     errno = saved;
     return entry;
 }
@@ -183,7 +182,9 @@ velm_simulation::read(const std::string& path, size_t limit)
         text.emplace(limit, '\0');
         ssize_t n = pread(fd, text->data(), limit, 0);
         text->resize(static_cast<size_t>(std::max(n, ssize_t(0))));
-        if (fstat(fd, &st) == 0 && st.st_size > static_cast<off_t>(limit) && limit > 64)
+        if (n < 0)
+            trouble.emplace(canonical, errno), text.reset();
+        else if (fstat(fd, &st) == 0 && st.st_size > static_cast<off_t>(limit) && limit > 64)
             trouble.emplace(canonical, EFBIG);
         (void)close(fd);
     }
@@ -191,24 +192,42 @@ velm_simulation::read(const std::string& path, size_t limit)
     return text;
 }
 
-std::vector<std::string>
+// The names below a real directory; false when it cannot be listed whole.
+static bool
+list(int base, const std::string& real, std::set<std::string>& found)
+{
+    int fd = openat(base, relative(real).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    DIR* directory = fd < 0 ? nullptr : fdopendir(fd);
+    if (directory == nullptr) {
+        if (fd >= 0)
+            (void)close(fd);
+        return false;
+    }
+    errno = 0;
+    // cppcheck-suppress readdirCalled ; one thread, one directory stream
+    while (const struct dirent* child = readdir(directory))
+        found.insert(child->d_name);
+    int error = errno;
+    closedir(directory);
+    found.erase("."), found.erase("..");
+    errno = error;
+    return error == 0;
+}
+
+std::optional<std::vector<std::string>>
 velm_simulation::names(const std::string& path)
 {
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, true, canonical);
     std::set<std::string> found;
-    int fd =
-        entry.kind == velm_entry::directory && !entry.fresh
-            ? openat(entry.base, relative(entry.real).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)
-            : -1;
-    if (DIR* directory = fd < 0 ? nullptr : fdopendir(fd)) {
-        // cppcheck-suppress readdirCalled ; one thread, one directory stream
-        while (const struct dirent* child = readdir(directory))
-            found.insert(child->d_name);
-        closedir(directory);
+    if (entry.kind != velm_entry::directory ||
+        (!entry.fresh && !list(entry.base, entry.real, found))) {
+        if (entry.kind == velm_entry::directory)
+            trouble.emplace(canonical, errno);
+        errno = saved;
+        return std::nullopt;
     }
-    found.erase("."), found.erase("..");
     // What the simulation changed right below it.
     for (auto c = changed.lower_bound(canonical + "/"); c != changed.end(); ++c) {
         if (c->first.compare(0, canonical.size() + 1, canonical + "/") != 0)
@@ -225,18 +244,26 @@ velm_simulation::names(const std::string& path)
     return std::vector<std::string>(found.begin(), found.end());
 }
 
+void
+velm_simulation::io_failed(const std::string& path, int error)
+{
+    int saved = errno;
+    trouble.emplace(where(path, true), error);
+    errno = saved;
+}
+
 velm_simulation::changes
 velm_simulation::checkpoint()
 {
     settle();
-    return {changed, writes};
+    return changed;
 }
 
 void
 velm_simulation::rewind(const changes& to)
 {
     settle();
-    changed = to.entries, writes = to.writes;
+    changed = to;
 }
 
 std::string
@@ -255,6 +282,13 @@ velm_simulation::written(const std::string& path)
     std::string canonical;
     resolve(path, false, canonical);
     return writes.count(canonical) != 0;
+}
+
+void
+velm_simulation::forget_writes()
+{
+    settle();
+    writes.clear();
 }
 
 int
@@ -372,7 +406,7 @@ velm_simulation::may_remove(const char* path, std::string& canonical, velm_entry
 }
 
 int
-velm_simulation::unlink(const char* path)
+velm_simulation::unlink_entry(const char* path)
 {
     int saved = errno;
     std::string canonical;
@@ -384,6 +418,15 @@ velm_simulation::unlink(const char* path)
     changed[canonical] = velm_entry();
     errno = saved;
     return 0;
+}
+
+int
+velm_simulation::unlink(const char* path)
+{
+    int removed = unlink_entry(path);
+    if (removed != 0 && errno != ENOENT)
+        refusals.emplace_back(path, errno);
+    return removed;
 }
 
 int
@@ -417,16 +460,16 @@ int
 velm_simulation::symlink(const char* target, const char* path)
 {
     int saved = errno;
-    if (*target == '\0')
-        return fail(ENOENT);
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0)
-        return fail(entry.error);
-    if (entry.kind != velm_entry::absent)
-        return fail(EEXIST);
-    if (int error = may_change_in(parent_of(canonical)); error != 0)
+    int error = *target == '\0'                          ? ENOENT
+                : entry.error != 0                       ? entry.error
+                : entry.kind != velm_entry::absent       ? EEXIST
+                                                         : may_change_in(parent_of(canonical));
+    if (error != 0) {
+        refusals.emplace_back(path, error);
         return fail(error);
+    }
     velm_entry link;
     link.kind = velm_entry::link, link.text = target, link.fresh = true;
     changed[canonical] = link;
@@ -439,7 +482,8 @@ velm_simulation::symlink(const char* target, const char* path)
 bool
 velm_simulation::empty_directory(const std::string& canonical)
 {
-    return names(canonical).empty();
+    auto listed = names(canonical);
+    return listed && listed->empty();
 }
 
 int
@@ -463,7 +507,7 @@ velm_simulation::rmdir(const char* path)
 int
 velm_simulation::remove(const char* path)
 {
-    int removed = unlink(path);
+    int removed = unlink_entry(path);
     return removed == 0 || errno != EISDIR ? removed : rmdir(path);
 }
 
@@ -575,75 +619,11 @@ velm_simulation::open(const char* path, int flags, mode_t /*mode*/)
     return fd;
 }
 
-bool
-velm_simulation::apply(const velm_command& command)
+void
+velm_simulation::put(const std::string& canonical, const velm_entry& made)
 {
-    int saved = errno;
-    std::string canonical;
-    velm_entry entry =
-        resolve(command.verb == velm_command::symlink_to ? command.second : command.first,
-                command.verb == velm_command::copy_tree || command.verb == velm_command::move_tree,
-                canonical);
-    // Root may change anything but what the kernel refuses to everyone.
-    auto refused = [this](const std::string& directory) {
-        int error = may_change_in(directory);
-        return error == EROFS || error == EPERM;
-    };
-    bool changes_first = command.verb != velm_command::make_dirs &&
-                         command.verb != velm_command::copy_tree &&
-                         command.verb != velm_command::write_word;
-    if (changes_first && refused(parent_of(canonical)))
-        return false;
-    velm_entry made;
-    made.fresh = true;
-    switch (command.verb) {
-    case velm_command::symlink_to:
-        if (entry.kind == velm_entry::directory) // ln puts the link inside
-            canonical += command.first.substr(command.first.rfind('/'));
-        made.kind = velm_entry::link, made.text = command.first;
-        break;
-    case velm_command::remove_entry:
-        if (entry.kind == velm_entry::directory)
-            return false;
-        break;
-    case velm_command::remove_tree:
-        break;
-    case velm_command::make_dirs:
-        made.kind = velm_entry::directory;
-        for (size_t slash = 1; slash != std::string::npos;) {
-            slash = command.first.find('/', slash + 1);
-            std::string above;
-            if (resolve(command.first.substr(0, slash), true, above).kind != velm_entry::absent)
-                continue;
-            if (refused(parent_of(above)))
-                return false;
-            changed[above] = made;
-        }
-        errno = saved;
-        return true;
-    case velm_command::copy_tree:
-    case velm_command::move_tree:
-        if (look(command.second).kind != velm_entry::absent)
-            return true; // test -e SECOND || ...
-        if (entry.kind != velm_entry::directory)
-            return false;
-        made = entry, made.text.clear();
-        if (command.verb == velm_command::move_tree)
-            changed[canonical] = velm_entry();
-        canonical.clear();
-        resolve(command.second, false, canonical);
-        break;
-    case velm_command::write_word:
-        canonical.clear();
-        resolve(command.second, true, canonical);
-        made.kind = velm_entry::file, made.text = command.first + "\n";
-        break;
-    }
-    if (entry.error != 0 || refused(parent_of(canonical)))
-        return false;
+    settle();
     changed[canonical] = made;
-    errno = saved;
-    return true;
 }
 
 void
@@ -654,41 +634,4 @@ velm_simulation::graft(const std::string& path, int outside)
     velm_entry copy;
     copy.kind = velm_entry::directory, copy.base = outside;
     changed[canonical] = copy;
-}
-
-// A word the shell takes as it stands, or quoted.
-static std::string
-quote(const std::string& word)
-{
-    static const char plain[] =
-        "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789_./+:=@%,-";
-    if (!word.empty() && word.find_first_not_of(plain) == std::string::npos)
-        return word;
-    std::string out = "'";
-    for (char c : word)
-        out += c == '\'' ? std::string("'\\''") : std::string(1, c);
-    return out + "'";
-}
-
-std::string
-shell_text(const velm_command& c, const std::string& root)
-{
-    std::string first = quote(root + c.first), second = quote(root + c.second);
-    switch (c.verb) {
-    case velm_command::symlink_to:
-        return "ln -sfn " + quote(c.first) + " " + second;
-    case velm_command::remove_entry:
-        return "rm -f " + first;
-    case velm_command::remove_tree:
-        return "rm -rf " + first;
-    case velm_command::make_dirs:
-        return "mkdir -p " + first;
-    case velm_command::copy_tree: // once: a second cp -a would copy into the copy
-        return "test -e " + second + " || cp -a " + first + " " + second;
-    case velm_command::move_tree:
-        return "test -e " + second + " || mv " + first + " " + second;
-    case velm_command::write_word:
-        return "printf '%s\\n' " + quote(c.first) + " >" + second;
-    }
-    return "";
 }

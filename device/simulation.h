@@ -5,8 +5,8 @@
 // component at a time, so nothing outside it is ever reached. A change is
 // refused as the kernel would refuse it to the boot: on a read-only file
 // system, an immutable entry, or one the boot's user may not change.
-#ifndef TZLINKS_STATUS_SIMULATION_H
-#define TZLINKS_STATUS_SIMULATION_H
+#ifndef TZLINKS_DEVICE_SIMULATION_H
+#define TZLINKS_DEVICE_SIMULATION_H
 
 #include "support/fs.h"
 
@@ -21,7 +21,7 @@
 struct velm_entry {
     enum kind_t { absent, link, file, directory, fifo, socket, device } kind = absent;
     std::string text;    // a link's target; a file's content, when it is a new one
-    int error = 0;       // why the path could not be looked up, or 0
+    int error = 0;       // why the path could not be looked up or the link read, or 0
     bool shared = false; // a regular file with other names (hard links)
     bool fresh = false;  // made by the simulation: nothing real stands behind it
     mode_t mode = 0;     // permission bits
@@ -29,23 +29,7 @@ struct velm_entry {
     std::string real;    // ... at this path ("" for base itself, else "/a/b")
 };
 
-// A change made as a person at the shell would make it. The shell text is
-// what a report shows; apply() makes the same change to a simulation.
-struct velm_command {
-    enum verb_t {
-        symlink_to,   // ln -sfn FIRST SECOND
-        remove_entry, // rm -f FIRST
-        remove_tree,  // rm -rf FIRST
-        make_dirs,    // mkdir -p FIRST
-        copy_tree,    // cp -a FIRST SECOND (a directory), unless SECOND exists
-        move_tree,    // mv FIRST SECOND, unless SECOND exists
-        write_word,   // printf '%s\n' FIRST >SECOND
-    } verb;
-    std::string first, second;
-};
-// The command as a shell line, every path of the device below root ("" for
-// the device itself); a link's target is the device's own path.
-std::string shell_text(const velm_command& command, const std::string& root);
+using velm_names = std::vector<std::string>;
 
 class velm_simulation final : public velm_system_calls {
   public:
@@ -60,35 +44,39 @@ class velm_simulation final : public velm_system_calls {
     int symlink(const char* target, const char* path) override;
     int remove(const char* path) override;
     int open(const char* path, int flags, mode_t mode) override;
+    void io_failed(const std::string& path, int error) override;
 
-    // The entry at path, its last component not followed (or followed).
-    velm_entry look(const std::string& path, bool follow = false);
+    // The entry at path, its last component not followed (or followed);
+    // with where it leads inside the root, when canonical is given.
+    velm_entry look(const std::string& path, bool follow = false,
+                    std::string* canonical = nullptr);
     // Up to limit bytes of the file at path, following links; none when it
     // is no regular file or cannot be read. A cut shows as limit bytes.
     std::optional<std::string> read(const std::string& path, size_t limit);
-    // The names in the directory at path, as a listing shows them now.
-    std::vector<std::string> names(const std::string& path);
-    // Makes a change as a shell command run by root would; false when the
-    // command would fail (a read-only file system, an immutable directory,
-    // nothing to move), and nothing changes then.
-    bool apply(const velm_command& command);
+    // The names in the directory at path, as a listing shows them now;
+    // none when it is no directory or cannot be listed.
+    std::optional<std::vector<std::string>> names(const std::string& path);
+    // Puts made at the canonical path, as a change of the tree's.
+    void put(const std::string& canonical, const velm_entry& made);
     // Makes path a copy of the directory below outside, which lies outside
     // the root (an update about to be staged).
     void graft(const std::string& path, int outside);
+    // Whether the boot may add or remove entries in a directory: 0, or the
+    // error the kernel gives it.
+    int may_change_in(const std::string& directory);
     // Forgets every simulated change.
     void reset();
     // The simulated changes so far, to come back to.
-    struct changes {
-        std::map<std::string, velm_entry> entries;
-        std::set<std::string> writes;
-    };
+    using changes = std::map<std::string, velm_entry>;
     changes checkpoint();
     void rewind(const changes& to);
     // Where path leads inside the root, its last component not followed
     // (or followed).
     std::string where(const std::string& path, bool follow = false);
-    // Whether the last run of the boot wrote the file at path.
+    // Whether the file at path was written since the writes were forgotten
+    // (as a run of the boot begins).
     bool written(const std::string& path);
+    void forget_writes();
 
     // Whether changes are judged with the boot's own credentials (root);
     // otherwise only read-only file systems are foreseen.
@@ -97,17 +85,20 @@ class velm_simulation final : public velm_system_calls {
     // with the error; and those it tried again from the beginning.
     const std::map<std::string, int>& unread() const { return trouble; }
     void forget_unread() { trouble.clear(); }
+    // The changes the tree refused (an unlink, a new link), in order: the
+    // path as the call named it, and the error.
+    std::vector<std::pair<std::string, int>> refusals;
 
   private:
     velm_entry real_entry(int base, const std::string& real);
     velm_entry look_up(int base, const std::string& real);
     velm_entry entry_at(const std::string& canonical);
     velm_entry resolve(const std::string& path, bool follow, std::string& canonical);
-    int may_change_in(const std::string& directory);
     int may_write(const velm_entry& entry, int mode);
     bool unremovable(const velm_entry& entry);
     int may_remove(const char* path, std::string& canonical, velm_entry& entry);
     int rmdir(const char* path);
+    int unlink_entry(const char* path);
     bool empty_directory(const std::string& canonical);
     int open_for_writing(const std::string& canonical, const velm_entry& entry);
     int open_for_reading(const std::string& canonical, const velm_entry& entry, int flags);

@@ -4,8 +4,8 @@
 // leaves, the lines it writes); the facts of the tree only say why.
 #include "status/report.h"
 
-#include "dataset/icu.h"
-#include "driver/startup.h"
+#include "dataset/dataset.h"
+#include "device/data.h"
 #include "support/paths.h"
 #include "support/prefix.h"
 #include "support/version.h"
@@ -85,27 +85,11 @@ parent_of(const std::string& path)
     return path.substr(0, path.rfind('/'));
 }
 
-// The update a path lies in, "/var/db/timezone/tz/NAME", or "".
+// The update a link names, "/var/db/timezone/tz/NAME", or "".
 std::string
 update_of(const velm_text& path)
 {
-    static const size_t prefix = sizeof velm_path::updates - 1;
-    if (!path || path->size() <= prefix || !has_prefix(*path, velm_path::updates) ||
-        (*path)[prefix] == '/')
-        return "";
-    return path->substr(0, path->find('/', prefix));
-}
-
-// Whether the run wrote a line that begins with text.
-bool
-said(const velm_run& run, const char* text)
-{
-    std::string start = std::string("tzlinks: ") + text;
-    for (const std::string& message : run.messages) {
-        if (has_prefix(message, start.c_str()))
-            return true;
-    }
-    return false;
+    return velm_update_of(path.value_or(""));
 }
 
 // What a run leaves, in words.
@@ -151,21 +135,6 @@ velm_entry::kind_t
 kind(velm_simulation& tree, const std::string& path, bool follow = false)
 {
     return tree.look(path, follow).kind;
-}
-
-bool
-zone_file(velm_simulation& tree, const std::string& path)
-{
-    return tree.read(path, 4) == "TZif";
-}
-
-// The first word of a file, from its first few kilobytes.
-std::string
-first_word(velm_simulation& tree, const std::string& path)
-{
-    std::string text = tree.read(path, longest_text).value_or("");
-    size_t begin = std::min(text.find_first_not_of(spaces), text.size());
-    return text.substr(begin, text.find_first_of(spaces, begin) - begin);
 }
 
 // The release a tz database's own source names on its first line, as
@@ -234,7 +203,7 @@ find_places(finder& f)
         copy.push_back(
             {velm_command::copy_tree, velm_path::legacy_zoneinfo, velm_path::system_zoneinfo});
         if (!release.empty() &&
-            first_word(tree, velm_path::legacy_zoneinfo + std::string("/+VERSION")).empty())
+            velm_first_word(tree, velm_path::legacy_zoneinfo + std::string("/+VERSION")).empty())
             copy.push_back({velm_command::write_word, release, version});
         no.tries = {copy};
     }
@@ -279,7 +248,7 @@ find_system_version(finder& f)
                         " holds a number too large for a version: not even the system data can "
                         "be linked.")
             : f.add("warning", "system-version", version,
-                    (first_word(tree, version).empty() ? version + " holds no version, so t"
+                    (velm_first_word(tree, version).empty() ? version + " holds no version, so t"
                                                        : std::string("T")) +
                         "he system data's version is \"" + f.r.system.version +
                         "\", which is not a version: every boot warns about it, the system data "
@@ -311,7 +280,7 @@ find_live(finder& f)
                   standing(tree, velm_path::zoneinfo_link) +
                   ", which leads to no tz database: programs have none; " + consequence + ".")
             .tries = {{}, reset, system};
-    } else if (said(r.next_boot, velm_says::invalid_current)) {
+    } else if (!r.next_boot.understood) {
         f.add("warning", "zoneinfo-not-understood", velm_path::zoneinfo_link,
               std::string(velm_path::zoneinfo_link) + " " +
                   standing(tree, velm_path::zoneinfo_link) + ", which is neither an update below " +
@@ -319,7 +288,7 @@ find_live(finder& f)
                   ".")
             .tries = {{}, reset, system};
     }
-    if (!said(r.next_boot, velm_says::incompatible))
+    if (!r.next_boot.current.present || r.next_boot.kept)
         return;
     std::string why =
         !r.live.present ? "has a version number too large"
@@ -356,19 +325,18 @@ find_latest(finder& f)
             entry.kind != velm_entry::link ? "is no link"
             : !has_prefix(target, "/")
                 ? "names \"" + target + "\": a relative target is never understood"
-            : !has_prefix(target, velm_path::updates) || update_of(target).empty()
+            : !has_prefix(target, velm_path::updates) || velm_update_of(target).empty()
                 ? "names \"" + target + "\", which is no update below " + velm_path::updates
                 : "names " + target + ", whose version holds a number too large";
         velm_finding& found =
             f.add("warning", "latest-not-understood", velm_path::latest_link,
                   std::string(velm_path::latest_link) + " " + why + ": the next boot " +
-                      (said(next, velm_says::unable) ? "gives up its choice and links the system "
-                                                       "data"
-                                                     : what_it_does(next)) +
+                      (next.abandoned ? "gives up its choice and links the system data"
+                                      : what_it_does(next)) +
                       ".");
         std::string meant = tree.where(std::string(velm_path::link_directory) + "/" + target);
         if (entry.kind == velm_entry::link && !has_prefix(target, "/") &&
-            update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
+            velm_update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
             found.tries.push_back({ln(meant, velm_path::latest_link)});
         found.tries.push_back(unlink);
         return;
@@ -378,8 +346,9 @@ find_latest(finder& f)
               "tz_latest names the data in use, " + latest.version + "; every boot says so.");
         return;
     }
-    bool refused = said(next, velm_says::refused);
-    if (!refused && !(next.action == "adopt" && latest.older))
+    // Refused by the next boot, or adopted and set aside by the one after.
+    auto refusal = refusal_of(next, r.after_next ? &*r.after_next : nullptr);
+    if (!refusal)
         return;
     std::string name = "tz_latest names " + latest.version;
     velm_commands to_live = r.live.present && !r.live.root.empty()
@@ -399,54 +368,34 @@ find_latest(finder& f)
         velm_finding& found =
             f.add("warning", "latest-not-a-version", latest.root,
                   name + ", a name that is not a version (such as 2025b.1.0): no boot adopts it.");
-        std::string word = first_word(tree, latest.root + "/zoneinfo/+VERSION");
-        std::string renamed = velm_path::updates + word + ".1.0";
-        found.manual = "a version as the name of " + latest.root + ", such as " +
-                       (word.empty() ? "2025b" : word) + ".1.0";
+        std::string word = velm_first_word(tree, latest.root + "/zoneinfo/+VERSION");
+        std::string version = velm_release_version(word.empty() ? "2025b" : word);
+        std::string renamed = velm_path::updates + version;
+        found.manual = "a version as the name of " + latest.root + ", such as " + version;
         if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
             kind(tree, renamed) == velm_entry::absent)
             found.tries = {{{velm_command::move_tree, latest.root, renamed},
                             ln(renamed, velm_path::latest_link)}};
-    } else if (!latest.compatible) {
-        std::string want = r.system.icu_schema;
-        std::string data = latest.root + "/icutz/icutz" + want + ".dat";
-        f.add("warning", latest.icu_schema.empty() ? "latest-no-icu" : "latest-other-schema",
-              latest.root,
-              latest.icu_schema.empty()
-                  ? name + ", which has no ICU data the boot can use (a regular file " + data +
-                        ", readable by others): no boot adopts it."
-                  : name + ", whose ICU data has schema " + latest.icu_schema +
-                        "; the system's is " + schema(want) + ": no boot adopts it.")
-            .manual = want.empty() ? "the system's ICU schema, such as 44l, as the first word of " +
-                                         std::string(velm_path::system_icu) + "/icutzformat.txt"
-                                   : "ICU data built for schema " + want + ", as " + data +
-                                         ", a regular file readable by others";
-    } else if (latest.older) {
-        f.add("warning", "latest-older-than-system", latest.root,
-              name + ", older than the system data, " + r.system.version +
-                  (refused ? ": no boot adopts it."
-                           : ": the next boot adopts it, the data in use being older still, and "
-                             "the boot after sets it aside."))
-            .tries = {unlink};
     } else {
-        f.add("warning", "latest-older", latest.root,
-              name + ", which is not newer than the data in use, " + r.live.version +
-                  ": no boot adopts it.")
-            .tries = {to_live, unlink};
+        velm_finding& found =
+            f.add("warning", refusal->id.c_str(), latest.root,
+                  name + ", " + refusal->reason +
+                      (!next.adopted ? ": no boot adopts it."
+                                     : ": the next boot adopts it, the data in use being older "
+                                       "still, and the boot after sets it aside."));
+        std::string want = r.system.icu_schema;
+        if (!latest.compatible)
+            found.manual = want.empty() ? "the system's ICU schema, such as 44l, as the first word "
+                                          "of " + std::string(velm_path::system_icu) +
+                                              "/icutzformat.txt"
+                                        : "ICU data built for schema " + want + ", as " +
+                                              latest.root + "/icutz/icutz" + want +
+                                              ".dat, a regular file readable by others";
+        else if (latest.older)
+            found.tries = {unlink};
+        else
+            found.tries = {to_live, unlink};
     }
-}
-
-// The file icutz<schema>.dat that the boot would find, directly in it.
-std::string
-icu_data_in(velm_simulation& tree, const std::string& directory)
-{
-    for (const std::string& name : tree.names(directory)) {
-        velm_entry entry = tree.look(directory + "/" + name);
-        if (!velm_icu_schema_in_name(name).empty() && entry.kind == velm_entry::file &&
-            (entry.mode & S_IROTH) != 0)
-            return directory + "/" + name;
-    }
-    return "";
 }
 
 // The updates unpacked below tz/: those no link names, and what is wrong
@@ -460,7 +409,7 @@ find_updates(finder& f)
          {r.zoneinfo, r.icutz, r.tz_latest, r.next_boot.zoneinfo, r.next_boot.icutz})
         named.push_back(update_of(link));
     velm_simulation& tree = f.now();
-    for (const std::string& name : tree.names(velm_path::updates)) {
+    for (const std::string& name : tree.names(velm_path::updates).value_or(velm_names())) {
         std::string root = velm_path::updates + name;
         if (std::find(named.begin(), named.end(), root) == named.end()) {
             f.add("note", "update-unnamed", root,
@@ -469,7 +418,7 @@ find_updates(finder& f)
             continue;
         }
         velm_version_match match = velm_version_match_text(name);
-        std::string word = first_word(tree, root + "/zoneinfo/+VERSION");
+        std::string word = velm_first_word(tree, root + "/zoneinfo/+VERSION");
         if (match.size == 5 && !word.empty() && word != match.group[1] + match.group[2])
             f.add("warning", "version-mismatch", root,
                   root + " holds the tz database " + word +
@@ -477,12 +426,11 @@ find_updates(finder& f)
                       match.group[2] + ": the boot orders it by its name.")
                 .manual = "the tz database of release " + match.group[1] + match.group[2] + " in " +
                           root + "/zoneinfo, or a directory named for release " + word;
-        std::string data = icu_data_in(tree, root + "/icutz");
-        std::string head = data.empty() ? "" : tree.read(data, 4).value_or("");
-        if (!data.empty() && (head.size() < 4 || head.compare(2, 2, "\xda\x27") != 0))
+        std::string data = velm_icu_file(tree, root + "/icutz");
+        if (!data.empty() && !velm_icu_data(tree, data))
             f.add("warning", "icu-data-bad", data,
                   data +
-                      (head.empty() ? " is empty"
+                      (tree.read(data, 1).value_or("").empty() ? " is empty"
                                     : " is no ICU data (it lacks the header "
                                       "ICU's data files begin with)") +
                       ": the boot goes by its name alone and uses it, and ICU's readers then "
@@ -499,32 +447,24 @@ find_next_boot(finder& f)
     const velm_run& next = r.next_boot;
     velm_commands system = {rm(velm_path::zoneinfo_link), rm(velm_path::latest_link)};
     if (next.exit_status != 0) {
-        // The entry it could not change, and why, from its words: the
-        // first refusal of the kernel, or else the last failure.
-        std::string failed, why;
-        auto refusal = [](const std::string& text) {
-            return text == strerror(EROFS) || text == strerror(EACCES) || text == strerror(EPERM);
-        };
-        for (const std::string& message : next.messages) {
-            for (const char* call : {"create_symlink: from ", "remove: could not remove "}) {
-                std::string start = std::string("tzlinks: ") + call;
-                if (!has_prefix(message, start.c_str()) || refusal(why))
-                    continue;
-                size_t end = message.rfind(": ");
-                failed = message.substr(start.size(), end - start.size());
-                failed.resize(std::min(failed.find(" to "), failed.size()));
-                why = message.substr(end + 2);
-            }
+        // The entry it could not change, and why: the first refusal of the
+        // kernel, or else the last failure.
+        std::string failed;
+        int why = 0;
+        auto refusal = [](int error) { return error == EROFS || error == EACCES || error == EPERM; };
+        for (const auto& [path, error] : next.refused) {
+            if (!refusal(why))
+                failed = path, why = error;
         }
         velm_finding& found =
             f.add("error", "next-boot-fails", "",
                   "The next boot cannot even link the system data" +
-                      (failed.empty() ? std::string() : " (" + failed + ": " + why + ")") +
+                      (failed.empty() ? std::string() : " (" + failed + ": " + strerror(why) + ")") +
                       ": it exits with status " + std::to_string(next.exit_status) +
                       " and leaves localtime as it is.");
         if (refusal(why))
             found.manual = "write access for root to " + parent_of(failed) +
-                           (why == strerror(EROFS) ? ", on a file system mounted read-write" : "");
+                           (why == EROFS ? ", on a file system mounted read-write" : "");
         else if (!failed.empty())
             found.tries = {clear(failed), {{velm_command::make_dirs, velm_path::updates, ""}}};
         else
@@ -571,7 +511,7 @@ zone_meant(velm_simulation& tree, const velm_text& target)
             return at.substr(tree_of.size() + 1);
     }
     std::string real = tree.where(at);
-    std::string update = update_of(real);
+    std::string update = velm_update_of(real);
     std::string top = update.empty() ? velm_path::system_zoneinfo : update + "/zoneinfo";
     return has_prefix(real, (top + "/").c_str()) ? real.substr(top.size() + 1) : "";
 }
@@ -581,9 +521,9 @@ find_localtime(finder& f)
 {
     const velm_report& r = f.r;
     const velm_run& next = r.next_boot;
-    bool usable_now = zone_file(f.now(), velm_path::localtime_link);
+    bool usable_now = velm_zone_file(f.now(), velm_path::localtime_link);
     std::string zone = zone_meant(f.now(), r.localtime);
-    bool usable_next = zone_file(f.next(), velm_path::localtime_link);
+    bool usable_next = velm_zone_file(f.next(), velm_path::localtime_link);
     std::string live = std::string(velm_path::zoneinfo_link) + "/";
     velm_commands to_zone = relink(live + zone, velm_path::localtime_link);
     std::string manual = "a link " + std::string(velm_path::localtime_link) + " to " + live +

@@ -2,19 +2,13 @@
 // tzlinks-status: says which time-zone data a device (or an image of one)
 // uses, what its next boot will do, what is wrong and how to repair it;
 // changes nothing.
-#include "status/command_line.h"
+#include "device/command_line.h"
+#include "device/device.h"
 #include "status/report.h"
 
-#include <cerrno>
-#include <climits>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
-#include <err.h>
-#include <fcntl.h>
-#include <string>
-#include <sys/stat.h>
-#include <unistd.h>
+#include <sysexits.h>
 
 static const char usage[] =
     "usage: tzlinks-status [--json | --commands | --metrics[=DIR]] [--root DIR]\n"
@@ -29,71 +23,66 @@ static const char help[] =
     "Exit status: 0 healthy, 1 degraded, 2 broken, 64 usage, 66 DIR unreadable or\n"
     "no device tree, 74 the report could not be written. See tzlinks-status(8).\n";
 
-// Whether DIR holds what a device tree holds: without var/ and usr/share/
-// the report would describe nothing but absences.
-static bool
-device_tree(int root)
+static const option options[] = {
+    {"json", no_argument, nullptr, 0},    {"commands", no_argument, nullptr, 0},
+    {"metrics", optional_argument, nullptr, 0}, {"root", required_argument, nullptr, 0},
+    {"help", no_argument, nullptr, 0},    {"version", no_argument, nullptr, 0},
+    {nullptr, 0, nullptr, 0}};
+static const char* const forms[] = {"json", "commands", "metrics"};
+
+// The form asked for, text when none: at most one.
+static int
+form_of(int argc, char** argv, std::string& form)
 {
-    struct stat st;
-    return fstatat(root, "var", &st, 0) == 0 && S_ISDIR(st.st_mode) &&
-           fstatat(root, "usr/share", &st, 0) == 0 && S_ISDIR(st.st_mode);
+    for (int i = 1; i < argc; ++i) {
+        for (const char* name : forms) {
+            if (strncmp(argv[i], "--", 2) != 0 || strncmp(argv[i] + 2, name, strlen(name)) != 0)
+                continue;
+            if (!form.empty())
+                return usage_error(usage, "given with another form", argv[i]);
+            form = name;
+        }
+    }
+    return 0;
 }
 
 int
 main(int argc, char** argv)
 {
-    const char* form = nullptr; // --json or --commands; text when none
-    const char* root = nullptr;
-    for (int i = 1; i < argc; ++i) {
-        std::string word = argv[i];
-        if (word == "--json" || word == "--commands" || word.compare(0, 9, "--metrics") == 0) {
-            if (form != nullptr)
-                return usage_error(usage, word == form ? "given twice" : "given with another form",
-                                   word);
-            form = argv[i];
-        } else if ((word == "--root" && i + 1 < argc) || word.compare(0, 7, "--root=") == 0) {
-            if (root != nullptr)
-                return usage_error(usage, "given twice", "--root");
-            root = word == "--root" ? argv[++i] : argv[i] + 7;
-        } else if (word == "--help" || word == "-h") {
-            (void)fputs(usage, stdout);
-            (void)fputs(help, stdout);
-            return written(0);
-        } else if (word == "--version") {
-            (void)printf("tzlinks-status %s\n", TZLINKS_VERSION);
-            return written(0);
-        } else {
-            return usage_error(
-                usage, word == "--root" ? "missing directory after" : "unknown argument", word);
-        }
+    std::map<std::string, std::string> given;
+    std::string form;
+    if (int status = read_options(argc, argv, options, usage, given); status != 0)
+        return status;
+    if (given.count("help") != 0) {
+        (void)fputs(usage, stdout);
+        (void)fputs(help, stdout);
+        return written(0);
     }
-    int root_fd = open(root ? root : "/", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (root_fd < 0) {
-        warn("cannot read %s", root ? root : "/");
-        return 66;
+    if (given.count("version") != 0) {
+        (void)printf("tzlinks-status %s\n", TZLINKS_VERSION);
+        return written(0);
     }
-    if (root != nullptr && !device_tree(root_fd)) {
-        warnx("%s holds no device tree: it lacks var/ or usr/share/", root);
-        return 66;
-    }
-    // Commands name the tree's paths below DIR, however DIR was given.
-    char real[PATH_MAX];
-    std::string prefix = root != nullptr && realpath(root, real) != nullptr ? real : "";
-    if (prefix == "/")
-        prefix.clear();
-    velm_simulation tree(root_fd);
-    velm_report report = make_report(tree, prefix);
-    std::string form_ = form == nullptr ? "" : form;
+    if (optind < argc)
+        return usage_error(usage, "unknown argument", argv[optind]);
+    if (int status = form_of(argc, argv, form); status != 0)
+        return status;
+    velm_device device;
+    auto root = given.find("root");
+    if (int status = open_device(root != given.end() ? root->second.c_str() : nullptr, device);
+        status != 0)
+        return status;
+    velm_simulation tree(device.fd);
+    velm_report report = make_report(tree, device.root);
     // Scripts and metrics are written whatever the health: it is inside them.
-    if (form_.compare(0, 10, "--metrics=") == 0)
-        return write_metrics(form_.substr(10), metrics_report(report)) ? 0 : 74;
-    (void)fputs((form_ == "--json"       ? json_report(report)
-                 : form_ == "--commands" ? commands_report(report)
-                 : form_ == "--metrics"  ? metrics_report(report)
-                                         : text_report(report))
+    if (form == "metrics" && !given["metrics"].empty())
+        return write_metrics(given["metrics"], metrics_report(report)) ? 0 : EX_IOERR;
+    (void)fputs((form == "json"       ? json_report(report)
+                 : form == "commands" ? commands_report(report)
+                 : form == "metrics"  ? metrics_report(report)
+                                      : text_report(report))
                     .c_str(),
                 stdout);
-    if (form_ == "--commands" || form_ == "--metrics")
+    if (form == "commands" || form == "metrics")
         return written(0);
     return written(report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2);
 }

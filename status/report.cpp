@@ -15,102 +15,21 @@
 #include <sysexits.h>
 #include <unistd.h>
 
-// While it lives, standard error is caught and the program is named as the
-// boot tool: the product code warns as it does at boot, and those are the
-// messages a boot would write.
-class velm_caught_messages {
-  public:
-    velm_caught_messages()
-        : saved(dup(2)), caught(memfd_create("messages", MFD_CLOEXEC)),
-          name(program_invocation_short_name)
-    {
-        if (saved < 0 || caught < 0 || dup2(caught, 2) < 0)
-            err(EX_OSERR, "cannot catch the boot's messages");
-        program_invocation_short_name = const_cast<char*>("tzlinks");
-    }
-    ~velm_caught_messages()
-    {
-        (void)dup2(saved, 2);
-        (void)close(saved);
-        (void)close(caught);
-        program_invocation_short_name = name;
-    }
-    velm_caught_messages(const velm_caught_messages&) = delete;
-    velm_caught_messages& operator=(const velm_caught_messages&) = delete;
-
-    std::vector<std::string> lines() const
-    {
-        std::string text(static_cast<size_t>(std::max(lseek(caught, 0, SEEK_END), off_t(0))), '\0');
-        text.resize(
-            static_cast<size_t>(std::max(pread(caught, text.data(), text.size(), 0), ssize_t(0))));
-        std::vector<std::string> all;
-        for (size_t at = 0, end; (end = text.find('\n', at)) != std::string::npos; at = end + 1)
-            all.push_back(text.substr(at, end - at));
-        return all;
-    }
-
-  private:
-    int saved, caught;
-    char* name;
-};
-
-static velm_text
-link_at(velm_simulation& tree, const std::string& path)
-{
-    velm_entry entry = tree.look(path);
-    return entry.kind == velm_entry::link ? velm_text(entry.text) : std::nullopt;
-}
-
-velm_run
-simulate_boot(velm_simulation& tree)
-{
-    velm_run run;
-    velm_text before = link_at(tree, velm_path::zoneinfo_link);
-    {
-        velm_caught_messages caught;
-        velm_calls_in_use simulated(tree);
-        errno = 0; // as in a process just started
-        run.exit_status = run_startup_sequence();
-        run.messages = caught.lines();
-    }
-    run.zoneinfo = link_at(tree, velm_path::zoneinfo_link);
-    run.icutz = link_at(tree, velm_path::icutz_link);
-    run.localtime = link_at(tree, velm_path::localtime_link);
-    if (tree.written(velm_path::record))
-        run.record = tree.look(velm_path::record).text;
-    run.action = run.exit_status != 0                         ? "fail"
-                 : run.zoneinfo == before                     ? "keep"
-                 : run.zoneinfo == velm_path::system_zoneinfo ? "reset"
-                                                              : "adopt";
-    return run;
-}
-
-static std::unique_ptr<velm_dataset>
-dataset_at(const std::string& root)
+// The dataset at root as the boot tool's own code builds it; none for a bad
+// path, or a version number beyond 32 bits.
+static velm_dataset_facts
+facts_at(const std::string& root)
 {
     try {
-        return std::make_unique<velm_dataset>(root);
+        return facts_of(velm_dataset(root));
     } catch (...) {
-        return nullptr; // a bad path, or a version number beyond 32 bits
+        return velm_dataset_facts();
     }
-}
-
-static velm_dataset_facts
-facts_of(const velm_dataset* dataset, const std::string& root)
-{
-    velm_dataset_facts facts;
-    if (dataset == nullptr)
-        return facts;
-    facts.present = true;
-    facts.root = root;
-    facts.version = dataset->get_version_string();
-    facts.version_understood = dataset->get_version().year >= 0;
-    facts.icu_schema = dynamic_cast<const velm_icu&>(*dataset->get_components().at(1)).get_schema();
-    return facts;
 }
 
 // The links, the record and the three datasets as they stand, read as the
-// boot tool reads them, with its own code.
+// boot tool reads them, with its own code; the datasets then as the next
+// boot judges them.
 static void
 read_state(velm_simulation& tree, velm_report& r)
 {
@@ -127,32 +46,34 @@ read_state(velm_simulation& tree, velm_report& r)
         r.localtime_zone = r.localtime->substr(live_prefix.size());
     velm_caught_messages quiet; // the messages of building them are the boot's to write
     velm_calls_in_use simulated(tree);
-    auto system = dataset_at("");
-    std::unique_ptr<velm_dataset> live, latest;
+    std::string live, latest;
     try {
-        r.live.root = current_dataset_path();
+        live = current_dataset_path();
         r.zoneinfo_understood = true;
-        live = dataset_at(r.live.root);
+        r.live = facts_at(live);
     } catch (...) {
         // No zoneinfo link that the boot tool understands.
     }
     try {
-        r.latest.root = latest_dataset_path();
-        latest = r.latest.root.empty() ? nullptr : dataset_at(r.latest.root);
+        latest = latest_dataset_path();
+        if (!latest.empty())
+            r.latest = facts_at(latest);
     } catch (...) {
         // A tz_latest that is no link.
     }
-    r.system = facts_of(r.system_missing ? nullptr : system.get(), "");
-    r.live = facts_of(live.get(), r.live.root);
-    r.latest = facts_of(latest.get(), r.latest.root);
-    if (!system)
-        return;
-    const velm_dataset& current = live ? *live : *system;
-    r.live.compatible = live && live->compatible(*system);
-    r.live.older = live && *system > *live;
-    r.latest.compatible = latest && latest->compatible(*system);
-    r.latest.newer = latest && *latest > current;
-    r.latest.older = latest && *system > *latest;
+    if (!r.system_missing)
+        r.system = facts_at("");
+}
+
+// What the next boot made of the datasets: compatible, older, newer.
+static void
+read_judgement(const velm_run& next, velm_report& r)
+{
+    if (r.live.present && next.current.present && next.current.root == r.live.root)
+        r.live.compatible = next.current.compatible, r.live.older = next.current.older;
+    if (r.latest.present && next.latest.present)
+        r.latest.compatible = next.latest.compatible, r.latest.newer = next.latest.newer,
+        r.latest.older = next.latest.older;
 }
 
 // What of the datasets and the record could not be read, by the report or
@@ -187,11 +108,10 @@ survey(velm_simulation& tree, const std::string& root)
     read_state(tree, r);
     r.now = now;
     r.next_boot = simulate_boot(tree);
+    read_judgement(r.next_boot, r);
     r.next = tree.checkpoint();
-    if (r.next_boot.exit_status == 0) {
-        simulate_boot(tree);
-        r.after_next = link_at(tree, velm_path::zoneinfo_link);
-    }
+    if (r.next_boot.exit_status == 0)
+        r.after_next = simulate_boot(tree);
     tree.rewind(now);
     note_unread(tree.unread(), r);
     find_problems(tree, r);
@@ -219,7 +139,7 @@ static std::optional<velm_report>
 repaired(velm_simulation& tree, const velm_commands& commands)
 {
     for (const velm_command& command : commands) {
-        if (!tree.apply(command))
+        if (!apply(tree, command))
             return std::nullopt;
     }
     simulate_boot(tree);

@@ -5,35 +5,14 @@
 #ifndef TZLINKS_STATUS_REPORT_H
 #define TZLINKS_STATUS_REPORT_H
 
-#include "status/simulation.h"
+#include "device/boot.h"
+#include "device/simulation.h"
+#include "device/text.h"
+#include "status/commands.h"
 
 #include <optional>
 #include <string>
 #include <vector>
-
-using velm_text = std::optional<std::string>; // absent or not understood: none
-
-struct velm_dataset_facts {
-    bool present = false;
-    std::string root; // empty for the system dataset
-    std::string version;
-    bool version_understood = false;
-    std::string icu_schema;
-    bool compatible = false; // with the system dataset
-    bool newer = false;      // latest: than the dataset in use
-    bool older = false;      // than the system's
-    bool unreadable = false; // something of its data could not be read
-};
-
-// One run of the boot tool on the simulation, and what it leaves.
-struct velm_run {
-    std::string action; // keep, adopt (the update tz_latest names), reset or fail
-    velm_text zoneinfo, icutz, localtime, record;
-    std::vector<std::string> messages; // what the run writes on standard error
-    int exit_status = 0;
-};
-
-using velm_commands = std::vector<velm_command>;
 
 struct velm_finding {
     std::string id, severity, message; // severity: error, warning or note
@@ -57,7 +36,7 @@ struct velm_report {
     std::string localtime_zone;       // what follows the live tree's prefix, if anything
     velm_dataset_facts live, system, latest;
     velm_run next_boot;
-    velm_text after_next; // zoneinfo as the boot after the next one leaves it
+    std::optional<velm_run> after_next; // the boot after it, when the next one succeeds
     std::vector<velm_finding> findings;
     std::string health; // healthy, degraded or broken
     // The device after every finding's commands and one boot, as simulated.
@@ -71,28 +50,15 @@ struct velm_report {
 // left as it was found. root is how commands name the tree.
 velm_report make_report(velm_simulation& tree, const std::string& root);
 
-// The parts of a report, for a report of a tree changed in the simulation.
-velm_run simulate_boot(velm_simulation& tree);
+// The findings of a report, for a report of a tree changed in the simulation.
 void find_problems(velm_simulation& tree, velm_report& r);
 
 // The version of the JSON report's contract (docs/status.schema.json):
 // raised whenever a change could break a reader of the one before.
 const int report_format = 1;
 
-// Texts longer than this are shown cut, the cut marked.
-const size_t longest_text = 8192;
 std::string text_report(const velm_report& report);
 std::string json_report(const velm_report& report);
-// Parts of both, for other reports made of them: a JSON string, findings
-// and a run as the reports show them.
-std::string json_text(const std::string& text);
-std::string json_findings(const std::vector<velm_finding>& findings, const std::string& root);
-std::string json_run(const velm_run& run);
-std::string text_findings(const std::vector<velm_finding>& findings, const std::string& root);
-std::string text_run(const velm_run& run);
-// A text as the text report shows it: cut, and with what is no printable
-// UTF-8 escaped as \xHH.
-std::string shown(const std::string& text);
 
 // The report in Prometheus's text exposition format, and its atomic write
 // into a textfile collector's directory (warns when it fails).

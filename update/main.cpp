@@ -1,21 +1,21 @@
 // SPDX-License-Identifier: Apache-2.0
 // tzlinks-update: stages an update on a device, after checking it with the
 // boot's own code, and prunes the updates nothing names any more.
+#include "update/tree.h"
 #include "update/update.h"
 
-#include "status/command_line.h"
-
-#include "support/version.h"
+#include "dataset/dataset.h"
+#include "device/command_line.h"
+#include "device/text.h"
+#include "support/paths.h"
 
 #include <cerrno>
-#include <climits>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <err.h>
 #include <fcntl.h>
-#include <map>
-#include <string>
-#include <sys/stat.h>
+#include <sysexits.h>
 #include <unistd.h>
 
 static const char usage[] =
@@ -38,146 +38,133 @@ static const char help[] =
     "Exit status: 0 adopted, 1 adopted with warnings, 2 refused, 64 usage, 66 SRC or\n"
     "DIR unreadable, 74 a change failed, 75 locked. See tzlinks-update(8).\n";
 
-// The options each command takes, and whether each takes a value.
-struct velm_option {
-    const char *command, *name;
-    bool value;
+static const option options[] = {
+    {"as", required_argument, nullptr, 0},   {"json", no_argument, nullptr, 0},
+    {"force", no_argument, nullptr, 0},      {"wait", required_argument, nullptr, 0},
+    {"root", required_argument, nullptr, 0}, {"dry-run", no_argument, nullptr, 0},
+    {"help", no_argument, nullptr, 0},       {"version", no_argument, nullptr, 0},
+    {nullptr, 0, nullptr, 0}};
+// The commands, and the options each takes.
+static const std::pair<const char*, std::set<std::string>> commands[] = {
+    {"check", {"as", "json", "root"}},
+    {"stage", {"as", "force", "wait", "root"}},
+    {"prune", {"dry-run", "wait", "root"}},
 };
-static const velm_option options[] = {
-    {"check", "--as", true},   {"check", "--json", false},    {"check", "--root", true},
-    {"stage", "--as", true},   {"stage", "--force", false},   {"stage", "--wait", true},
-    {"stage", "--root", true}, {"prune", "--dry-run", false}, {"prune", "--wait", true},
-    {"prune", "--root", true},
-};
 
-static const velm_option*
-option_of(const std::string& command, const std::string& word)
+// The options given that the command does not take: a usage error.
+static int
+check_options(const std::string& command, const std::map<std::string, std::string>& given)
 {
-    for (const velm_option& option : options) {
-        if (command == option.command && word == option.name)
-            return &option;
+    for (const auto& [name, takes] : commands) {
+        if (command != name)
+            continue;
+        for (const auto& [option, value] : given) {
+            if (takes.count(option) == 0)
+                return usage_error(usage, ("not an option of " + command).c_str(), "--" + option);
+        }
+        auto wait = given.find("wait");
+        if (wait != given.end() && (wait->second.size() > 5 ||
+                                    wait->second.find_first_not_of("0123456789") != std::string::npos))
+            return usage_error(usage, "not a number of seconds", wait->second);
+        return 0;
     }
-    return nullptr;
+    return usage_error(usage, "unknown command, not check, stage or prune", command);
 }
 
-// How long to wait for the lock: --wait's seconds, checked when given.
-static int
-seconds_to_wait(const std::map<std::string, std::string>& given)
+// A private directory to copy SRC into for check, removed at exit.
+static std::string scratch;
+static void
+remove_scratch()
 {
-    auto wait = given.find("--wait");
-    return wait == given.end() ? 60 : std::stoi(wait->second);
+    size_t slash = scratch.rfind('/');
+    int parent = open(scratch.substr(0, slash).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (parent >= 0)
+        (void)remove_all(parent, scratch.substr(slash + 1)), (void)close(parent);
 }
 
 static int
-open_device(const std::map<std::string, std::string>& given, velm_device& device)
+check(const velm_device& device, int src, const std::string& name, const std::string& version,
+      bool as_json)
 {
-    auto root = given.find("--root");
-    const char* path = root == given.end() ? "/" : root->second.c_str();
-    device.fd = open(path, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    struct stat st;
-    if (device.fd < 0) {
-        warn("cannot read %s", path);
-        return 66;
+    const char* tmp = getenv("TMPDIR");
+    scratch = std::string(tmp != nullptr && *tmp != '\0' ? tmp : "/tmp") + "/tzlinks-update.XXXXXX";
+    if (mkdtemp(scratch.data()) == nullptr) {
+        warn("cannot make a directory to check %s in", shown(name).c_str());
+        return EX_IOERR;
     }
-    if (root != given.end() && (fstatat(device.fd, "var", &st, 0) != 0 || !S_ISDIR(st.st_mode))) {
-        warnx("%s holds no device tree: no var/ below it", path);
-        return 66;
+    (void)atexit(remove_scratch);
+    int copy = open(scratch.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    velm_source walked;
+    if (copy < 0 || !walk_source(src, copy, name, walked))
+        return EX_IOERR;
+    velm_judgement j = judge(device, copy, walked, name, version);
+    if (j.error != 0) {
+        errno = j.error;
+        warn("cannot read %s", shown(device.named(j.unread)).c_str());
+        return EX_IOERR;
     }
-    char real[PATH_MAX];
-    device.root = root != given.end() && realpath(path, real) != nullptr ? real : "";
-    if (device.root == "/")
-        device.root.clear();
-    return 0;
+    (void)fputs((as_json ? judgement_json(j, name) : judgement_text(j, name)).c_str(), stdout);
+    return written(j.verdict);
 }
 
-// check and stage: SRC judged; stage then places it unless refused.
 static int
-check_or_stage(const std::string& command, const std::string& name,
-               const std::map<std::string, std::string>& given, const velm_device& device)
+run(const std::string& command, const std::string& source,
+    const std::map<std::string, std::string>& given)
 {
-    int src = open(name.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (src < 0) {
-        warn("cannot read %s", name.c_str());
-        return 66;
+    velm_device device;
+    auto root = given.find("root");
+    if (int status = open_device(root != given.end() ? root->second.c_str() : nullptr, device);
+        status != 0)
+        return status;
+    int src = -1;
+    if (command != "prune" && (src = open(source.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) < 0) {
+        warn("cannot read %s", shown(source).c_str());
+        return EX_NOINPUT;
     }
-    auto as = given.find("--as");
-    std::string release = source_release(src);
-    std::string version = as != given.end() ? as->second : release.empty() ? "" : release + ".1.0";
-    if (command == "stage") {
-        int status = take_lock(device, seconds_to_wait(given));
-        if (status != 0)
-            return status;
+    auto as = given.find("as");
+    std::string release = src < 0 ? "" : source_release(src);
+    std::string version = as != given.end() ? as->second
+                          : release.empty() ? ""
+                                            : velm_release_version(release);
+    if (command == "check")
+        return check(device, src, source, version, given.count("json") != 0);
+    int links = device.open_directory(velm_path::link_directory);
+    if (links < 0) {
+        warn("cannot open %s", shown(device.named(velm_path::link_directory)).c_str());
+        return EX_IOERR;
     }
-    // A name that is no version is never a path below tz/ either.
-    velm_judgement j;
-    if (velm_version_match_text(version).size == 5)
-        j = judge(device, src, name, version);
-    else
-        j.version = version, j.problems = examine_source(src, name, version, "");
-    bool forced = given.count("--force") != 0;
-    bool unusable = false;
-    for (const velm_finding& problem : j.problems)
-        unusable = unusable || problem.severity == "error";
-    if (command == "check" || unusable || (j.verdict == refused && !forced)) {
-        (void)fputs((given.count("--json") != 0 ? judgement_json(j, name, device)
-                                                : judgement_text(j, name, device))
-                        .c_str(),
-                    stdout);
-        return written(command == "check" ? j.verdict : refused);
-    }
-    int status = stage(device, src, version);
-    if (status == 0) {
-        velm_simulation tree(device.fd);
-        (void)fputs(("Next boot\n" + text_run(make_report(tree, device.root).next_boot)).c_str(),
-                    stdout);
-    }
+    auto wait = given.find("wait");
+    int seconds = wait == given.end() ? 60 : atoi(wait->second.c_str());
+    if (int status = take_lock(device, links, seconds, command == "prune"); status != 0)
+        return status;
+    int status = command == "prune"
+                     ? prune(device, links, given.count("dry-run") != 0)
+                     : stage(device, links, src, source, version, given.count("force") != 0);
     return written(status);
 }
 
 int
 main(int argc, char** argv)
 {
-    std::string command = argc > 1 ? argv[1] : "";
-    if (command == "--help" || command == "-h" || command == "--version") {
-        (void)printf("%s", command == "--version" ? "tzlinks-update " TZLINKS_VERSION "\n" : usage);
-        if (command != "--version")
+    std::map<std::string, std::string> given;
+    if (int status = read_options(argc, argv, options, usage, given); status != 0)
+        return status;
+    if (given.count("help") != 0 || given.count("version") != 0) {
+        (void)fputs(given.count("help") != 0 ? usage : "tzlinks-update " TZLINKS_VERSION "\n",
+                    stdout);
+        if (given.count("help") != 0)
             (void)fputs(help, stdout);
         return written(0);
     }
-    if (command != "check" && command != "stage" && command != "prune")
-        return usage_error(usage, command.empty() ? "missing command" : "unknown command", command);
-    std::map<std::string, std::string> given;
-    std::string source;
-    for (int i = 2; i < argc; ++i) {
-        std::string word = argv[i];
-        const velm_option* option = option_of(command, word);
-        if (word == "--help" || word == "-h") {
-            (void)fputs(usage, stdout);
-            (void)fputs(help, stdout);
-            return written(0);
-        } else if (option != nullptr) {
-            if (given.count(word) != 0)
-                return usage_error(usage, "given twice", word);
-            if (option->value && i + 1 == argc)
-                return usage_error(usage, "missing value after", word);
-            given[word] = option->value ? argv[++i] : "";
-            const std::string& value = given[word];
-            if (word == "--wait" && (value.empty() || value.size() > 5 ||
-                                     value.find_first_not_of("0123456789") != std::string::npos))
-                return usage_error(usage, "not a number of seconds", value);
-        } else if (word[0] != '-' && command != "prune" && source.empty()) {
-            source = word;
-        } else {
-            return usage_error(usage, "unknown argument", word);
-        }
-    }
-    if (command != "prune" && source.empty())
-        return usage_error(usage, "missing SRC for", command);
-    velm_device device;
-    if (int status = open_device(given, device); status != 0)
+    if (optind == argc)
+        return usage_error(usage, "missing command", "check, stage or prune");
+    std::string command = argv[optind];
+    if (int status = check_options(command, given); status != 0)
         return status;
-    if (command != "prune")
-        return check_or_stage(command, source, given, device);
-    int status = take_lock(device, seconds_to_wait(given));
-    return written(status != 0 ? status : prune(device, given.count("--dry-run") != 0));
+    bool takes_source = command != "prune";
+    if (takes_source && optind + 1 == argc)
+        return usage_error(usage, "missing SRC for", command);
+    if (optind + 1 + (takes_source ? 1 : 0) < argc)
+        return usage_error(usage, "unknown argument", argv[optind + 1 + (takes_source ? 1 : 0)]);
+    return run(command, takes_source ? argv[optind + 1] : "", given);
 }

@@ -1,86 +1,103 @@
 // SPDX-License-Identifier: Apache-2.0
 // Pruning: updates no link names, and what an interrupted stage left. A
 // link names an update when, read as the boot reads it or followed inside
-// the tree, it leads into the update's directory.
+// the tree, it leads into the update's directory. Nothing is removed on
+// what could not be read.
 #include "update/tree.h"
 #include "update/update.h"
 
+#include "device/data.h"
+#include "device/text.h"
 #include "support/paths.h"
 #include "support/prefix.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <err.h>
 #include <fcntl.h>
 #include <set>
 #include <sys/stat.h>
+#include <sysexits.h>
 #include <unistd.h>
 
-// The name below tz/ that a path lies in, or "".
-static std::string
-update_named(const std::string& path)
-{
-    static const size_t prefix = sizeof velm_path::updates - 1;
-    if (!has_prefix(path, velm_path::updates))
-        return "";
-    return path.substr(prefix, path.find('/', prefix) - prefix);
-}
-
-static std::set<std::string>
-named_updates(const velm_device& device)
+// The updates the links name: 0, or the errno of a read that failed.
+static int
+named_updates(const velm_device& device, std::set<std::string>& named, std::string& unread)
 {
     velm_simulation tree(device.fd);
-    std::set<std::string> named;
     for (const char* link :
          {velm_path::zoneinfo_link, velm_path::icutz_link, velm_path::latest_link}) {
-        velm_entry entry = tree.look(link);
-        named.insert(update_named(entry.kind == velm_entry::link ? entry.text : ""));
-        named.insert(update_named(tree.where(link, true)));
+        std::string canonical;
+        named.insert(velm_update_of(link_at(tree, link).value_or("")));
+        tree.look(link, true, &canonical);
+        named.insert(velm_update_of(canonical));
     }
     named.erase("");
-    return named;
+    // A loop of links names nothing; any other failure could hide a name.
+    for (const auto& [path, error] : tree.unread()) {
+        if (error != ELOOP && error != ENAMETOOLONG && error != EFBIG)
+            return unread = path, error;
+    }
+    return 0;
+}
+
+// Removes name below dir, or says it would: 0, or EX_IOERR (said).
+static int
+remove_named(int dir, const std::string& name, const std::string& path, bool dry_run)
+{
+    std::string failed;
+    if (int error = dry_run ? 0 : remove_all(dir, name, &failed); error != 0) {
+        errno = error;
+        warn("cannot remove %s",
+             shown(path + (failed.size() > name.size() ? failed.substr(name.size()) : "")).c_str());
+        return EX_IOERR;
+    }
+    (void)printf("%s %s\n", dry_run ? "Would remove" : "Removed", shown(path).c_str());
+    return 0;
 }
 
 int
-prune(const velm_device& device, bool dry_run)
+prune(const velm_device& device, int links, bool dry_run)
 {
-    std::set<std::string> named = named_updates(device);
-    std::string links_path = device.at(velm_path::link_directory);
-    int links = open(links_path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    int updates = links < 0 ? -1 : openat(links, "tz", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (updates < 0) {
-        warn("cannot read %s", (links_path + "/tz").c_str());
-        return 74;
+    std::set<std::string> named;
+    std::string unread;
+    if (int error = named_updates(device, named, unread); error != 0) {
+        errno = error;
+        warn("cannot read %s; nothing was removed", shown(device.named(unread)).c_str());
+        return EX_IOERR;
+    }
+    std::string top = device.named(velm_path::updates);
+    int updates = device.open_directory(velm_path::updates);
+    std::vector<std::string> names;
+    int error = updates < 0 ? errno : names_in(updates, names);
+    if (error != 0 && !(updates < 0 && error == ENOENT)) {
+        errno = error;
+        warn("cannot read %s; nothing was removed", shown(top).c_str());
+        if (updates >= 0)
+            (void)close(updates);
+        return EX_IOERR;
     }
     int status = 0;
-    const char* done = dry_run ? "Would remove" : "Removed";
-    for (const std::string& name : names_in(updates)) {
-        std::string path = device.at(velm_path::updates + name);
+    for (const std::string& name : names) {
         struct stat st;
-        if (fstatat(updates, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
-            continue;
-        bool leftover = has_prefix(name, ".stage-");
-        if (!S_ISDIR(st.st_mode) && !named.count(name)) {
-            (void)printf("Left %s: it is no directory\n", path.c_str());
-        } else if (S_ISDIR(st.st_mode) && (leftover || !named.count(name))) {
-            if (!dry_run && !remove_all(updates, name)) {
-                warn("cannot remove %s", path.c_str());
-                status = 74;
-                continue;
-            }
-            (void)printf("%s %s\n", done, path.c_str());
+        std::string root = velm_path::updates + name;
+        if (fstatat(updates, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0) {
+            warn("cannot read %s; left", shown(device.named(root)).c_str());
+            status = EX_IOERR;
+        } else if (!S_ISDIR(st.st_mode) && named.count(root) == 0) {
+            (void)printf("Left %s: it is no directory\n", shown(device.named(root)).c_str());
+        } else if (S_ISDIR(st.st_mode) && (has_prefix(name, ".stage-") || named.count(root) == 0)) {
+            status = std::max(status, remove_named(updates, name, device.named(root), dry_run));
         }
     }
+    if (updates >= 0)
+        (void)close(updates);
     struct stat st;
-    if (fstatat(links, ".tz_latest.new", &st, AT_SYMLINK_NOFOLLOW) == 0) {
-        std::string path = links_path + "/.tz_latest.new";
-        if (!dry_run && unlinkat(links, ".tz_latest.new", 0) != 0 && errno != ENOENT) {
-            warn("cannot remove %s", path.c_str());
-            status = 74;
-        } else {
-            (void)printf("%s %s\n", done, path.c_str());
-        }
-    }
-    (void)close(updates), (void)close(links);
+    if (fstatat(links, ".tz_latest.new", &st, AT_SYMLINK_NOFOLLOW) == 0)
+        status = std::max(status, remove_named(links, ".tz_latest.new",
+                                               device.named(velm_path::link_directory) +
+                                                   "/.tz_latest.new",
+                                               dry_run));
     return status;
 }

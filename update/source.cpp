@@ -1,216 +1,206 @@
 // SPDX-License-Identifier: Apache-2.0
+// SRC, walked by descriptor: every entry looked at once, never through a
+// link, within fixed bounds, and copied as it was read. What it holds is
+// judged afterwards on the copy, so that a source changing meanwhile can
+// only spoil its own copy, never slip something past the checks.
+#include "update/tree.h"
 #include "update/update.h"
 
-#include "dataset/icu.h"
-#include "support/version.h"
+#include "dataset/first_word.h"
+#include "device/text.h"
+#include "support/fs.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <cstring>
-#include <dirent.h>
+#include <err.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
 
-// Reported entries that make an update unsafe; a tree can hold thousands.
+// No tz database nests deeper than 4 levels (zoneinfo/right/America/
+// Argentina) nor has a file near 64 MiB; a whole one with ICU's data is
+// some 10 MiB. Beyond these, a source is no update.
+const int deepest = 16;
+const off_t largest_file = off_t(64) << 20;
+const unsigned long long largest_update = 512ULL << 20;
+// Entries reported as unsafe; a tree can hold thousands.
 const size_t most_unsafe = 8;
+const int directory_flags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
-velm_finding
-problem(const char* severity, const char* id, const std::string& subject,
-        const std::string& message, const std::string& manual)
-{
-    velm_finding found;
-    found.severity = severity, found.id = id, found.subject = subject;
-    found.message = message, found.manual = manual;
-    return found;
-}
+struct walker {
+    const std::string& name; // SRC, as given
+    velm_source& found;
+    dev_t device;
 
-// Up to limit bytes of the regular file at path below dir, following
-// links (SRC's links stay inside it); none when it is no such file.
-std::optional<std::string>
-start_of(int dir, const std::string& path, size_t limit)
-{
-    int fd = openat(dir, path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
-    struct stat st;
-    std::optional<std::string> text;
-    if (fd >= 0 && fstat(fd, &st) == 0 && S_ISREG(st.st_mode)) {
-        text.emplace(limit, '\0');
-        text->resize(static_cast<size_t>(std::max(pread(fd, text->data(), limit, 0), ssize_t(0))));
+    void unsafe(const std::string& path, const std::string& why)
+    {
+        note_unsafe(found, name, path, why);
     }
-    if (fd >= 0)
+    bool walk(int from, int to, const std::string& at, int depth);
+    bool entry(int from, int to, const std::string& at, const std::string& child, int depth);
+    bool file(int in, int to, const std::string& path);
+};
+
+// The entry below from that fstatat described, opened without following
+// a link; -1 when it cannot be, or is no longer what was looked at.
+int
+reopen(int from, const std::string& child, const struct stat& was, int flags, std::string& why)
+{
+    int fd = openat(from, child.c_str(), flags);
+    struct stat st;
+    if (fd < 0) {
+        why = std::string("cannot be read: ") + strerror(errno);
+    } else if (fstat(fd, &st) != 0 || st.st_ino != was.st_ino || st.st_dev != was.st_dev) {
+        why = "changed while it was read";
         (void)close(fd);
-    return text;
+        fd = -1;
+    }
+    return fd;
 }
 
-// Whether a relative link target, read in the directory depth levels
-// below the top, stays below the top all the way.
+// A regular file's bytes into a new file of to, 0644; false when the
+// write failed (said). What SRC does meanwhile spoils only this copy.
 bool
-stays_inside(const std::string& target, int depth)
+walker::file(int in, int to, const std::string& path)
 {
-    if (target.empty() || target[0] == '/')
-        return false;
-    for (size_t at = 0; at <= target.size();) {
-        size_t end = std::min(target.find('/', at), target.size());
-        std::string name = target.substr(at, end - at);
-        depth += name == ".." ? -1 : name.empty() || name == "." ? 0 : 1;
-        if (depth < 0)
+    std::string child = path.substr(path.rfind('/') + 1);
+    int out = openat(to, child.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644);
+    bool copied = out >= 0 && fchmod(out, 0644) == 0;
+    char buffer[65536];
+    off_t total = 0;
+    ssize_t n = 0;
+    while (copied && (n = read(in, buffer, sizeof buffer)) > 0 && (total += n) <= largest_file)
+        copied = write(out, buffer, static_cast<size_t>(n)) == n;
+    if (copied && n < 0)
+        unsafe(path, std::string("cannot be read: ") + strerror(errno));
+    else if (copied && n > 0)
+        unsafe(path, "grew while it was copied");
+    if (out >= 0 && close(out) != 0)
+        copied = false;
+    if (!copied)
+        warn("cannot copy %s", shown(name + path).c_str());
+    return copied;
+}
+
+bool
+walker::entry(int from, int to, const std::string& at, const std::string& child, int depth)
+{
+    std::string path = at + "/" + child, why;
+    struct stat st;
+    if (fstatat(from, child.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
+        return unsafe(path, std::string("cannot be looked at: ") + strerror(errno)), true;
+    if (st.st_dev != device)
+        return unsafe(path, "lies on another file system"), true;
+    if (S_ISLNK(st.st_mode)) {
+        std::string target;
+        if (int error = velm_fs::read_link_at(from, child, target); error != 0)
+            return unsafe(path, std::string("cannot be read: ") + strerror(error)), true;
+        found.links.push_back(path);
+        if (symlinkat(target.c_str(), to, child.c_str()) != 0)
+            return warn("cannot copy %s", shown(name + path).c_str()), false;
+        return true;
+    }
+    if (!S_ISDIR(st.st_mode) && !S_ISREG(st.st_mode))
+        return unsafe(path, S_ISFIFO(st.st_mode)   ? "is a FIFO"
+                            : S_ISSOCK(st.st_mode) ? "is a socket"
+                                                   : "is a device"),
+               true;
+    if (S_ISDIR(st.st_mode) && depth >= deepest)
+        return unsafe(path, "lies deeper than " + std::to_string(deepest) + " levels"), true;
+    if (S_ISREG(st.st_mode) &&
+        (st.st_size > largest_file || (found.bytes += static_cast<unsigned long long>(
+                                           st.st_size)) > largest_update))
+        return unsafe(path, "is larger than an update's file can be"), true;
+    int in = reopen(from, child, st, S_ISDIR(st.st_mode) ? directory_flags
+                                                         : O_RDONLY | O_NOFOLLOW | O_NONBLOCK |
+                                                               O_CLOEXEC,
+                    why);
+    if (in < 0)
+        return unsafe(path, why), true;
+    bool done = true;
+    if (S_ISREG(st.st_mode)) {
+        done = file(in, to, path);
+    } else {
+        int out = -1;
+        if (mkdirat(to, child.c_str(), 0700) != 0 ||
+            (out = openat(to, child.c_str(), directory_flags)) < 0)
+            done = (warn("cannot copy %s", shown(name + path).c_str()), false);
+        done = done && walk(in, out, path, depth + 1);
+        if (done && fchmod(out, 0755) != 0)
+            done = (warn("cannot copy %s", shown(name + path).c_str()), false);
+        if (out >= 0)
+            (void)close(out);
+    }
+    (void)close(in);
+    return done;
+}
+
+bool
+walker::walk(int from, int to, const std::string& at, int depth)
+{
+    std::vector<std::string> names;
+    if (int error = names_in(from, names); error != 0)
+        unsafe(at, std::string("cannot be listed: ") + strerror(error));
+    for (const std::string& child : names) {
+        if (!entry(from, to, at, child, depth))
             return false;
-        at = end + 1;
     }
     return true;
 }
 
-// A link's target; "" when it cannot be read.
-std::string
-target_of(int dir, const std::string& name)
-{
-    char target[4096];
-    ssize_t n = readlinkat(dir, name.c_str(), target, sizeof target);
-    return n > 0 ? std::string(target, static_cast<size_t>(n)) : "";
-}
-
-// Walks the tree below dir (at: its path below SRC), never following a
-// link: only directories, regular files it can read and relative links
-// that stay inside SRC may be there.
-void
-walk(int dir, const std::string& at, int depth, const std::string& name,
-     std::vector<velm_finding>& found, size_t& unsafe)
-{
-    int listing = dup(dir);
-    DIR* entries = listing < 0 ? nullptr : fdopendir(listing);
-    if (entries == nullptr) {
-        if (listing >= 0)
-            (void)close(listing);
-        return;
-    }
-    rewinddir(entries); // a duplicate shares the position of a listing before
-    // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* entry = readdir(entries)) {
-        std::string child = entry->d_name, path = at + "/" + child, why;
-        if (child == "." || child == "..")
-            continue;
-        struct stat st;
-        int fd = -1;
-        if (fstatat(dir, child.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
-            why = std::string("cannot be looked at: ") + strerror(errno);
-        else if (S_ISLNK(st.st_mode) && !stays_inside(target_of(dir, child), depth))
-            why = "is a link that leads out of it";
-        else if (!S_ISLNK(st.st_mode) && !S_ISREG(st.st_mode) && !S_ISDIR(st.st_mode))
-            why = S_ISFIFO(st.st_mode)   ? "is a FIFO"
-                  : S_ISSOCK(st.st_mode) ? "is a socket"
-                                         : "is a device";
-        else if (!S_ISLNK(st.st_mode) &&
-                 (fd = openat(dir, child.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)) <
-                     0)
-            why = std::string("cannot be read: ") + strerror(errno);
-        if (!why.empty() && unsafe++ < most_unsafe)
-            found.push_back(problem("error", "source-unsafe", name + path,
-                                    name + path + " " + why +
-                                        ": an update holds only directories, regular files and "
-                                        "relative links that stay inside it.",
-                                    name + " without " + path.substr(1)));
-        if (fd >= 0 && S_ISDIR(st.st_mode))
-            walk(fd, path, depth + 1, name, found, unsafe);
-        if (fd >= 0)
-            (void)close(fd);
-    }
-    closedir(entries);
-}
-
-// The ICU data file the boot would find directly in icutz/: its name.
-std::string
-icu_data_in(int src)
-{
-    int fd = openat(src, "icutz", O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    DIR* entries = fd < 0 ? nullptr : fdopendir(fd);
-    std::string found;
-    // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* entry = entries != nullptr ? readdir(entries) : nullptr) {
-        struct stat st;
-        if (!velm_icu_schema_in_name(entry->d_name).empty() &&
-            fstatat(fd, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) == 0 && S_ISREG(st.st_mode) &&
-            (st.st_mode & S_IROTH) != 0 && found.empty())
-            found = entry->d_name;
-    }
-    if (entries != nullptr)
-        closedir(entries);
-    else if (fd >= 0)
-        (void)close(fd);
-    return found;
-}
-
 } // namespace
+
+void
+note_unsafe(velm_source& found, const std::string& name, const std::string& path,
+            const std::string& why)
+{
+    if (found.unsafe++ < most_unsafe)
+        found.problems.push_back({"source-unsafe", "error", name + path,
+                                  name + path + " " + why +
+                                      ": an update holds only directories, regular files and "
+                                      "links that stay inside it.",
+                                  path.empty() ? "a readable " + name
+                                               : name + " without " + path.substr(1)});
+}
+
+void
+finish_unsafe(velm_source& found, const std::string& name)
+{
+    if (found.unsafe > most_unsafe)
+        found.problems.push_back({"source-unsafe", "error", name,
+                                  std::to_string(found.unsafe - most_unsafe) + " more entries of " +
+                                      name + " are unsafe as well.",
+                                  name + " without them"});
+    found.unsafe = std::min(found.unsafe, most_unsafe);
+}
+
+bool
+walk_source(int src, int to, const std::string& name, velm_source& found)
+{
+    struct stat st;
+    if (fstat(src, &st) != 0)
+        return warn("cannot read %s", shown(name).c_str()), false;
+    walker w{name, found, st.st_dev};
+    return w.walk(src, to, "", 0);
+}
 
 std::string
 source_release(int src)
 {
-    std::string text = start_of(src, "zoneinfo/+VERSION", 4096).value_or("");
-    const char* spaces = " \t\n\v\f\r";
-    size_t begin = std::min(text.find_first_not_of(spaces), text.size());
-    return text.substr(begin, text.find_first_of(spaces, begin) - begin);
-}
-
-std::vector<velm_finding>
-examine_source(int src, const std::string& name, const std::string& version,
-               const std::string& zone)
-{
-    std::vector<velm_finding> found;
-    velm_version_match match = velm_version_match_text(version);
-    if (match.size != 5)
-        found.push_back(problem("error", "source-not-a-version", name,
-                                "\"" + version +
-                                    "\" is not a version as the boot reads them "
-                                    "(such as 2025b.1.0): no boot would adopt it.",
-                                "--as with a version, such as 2025b.1.0"));
+    int zoneinfo = openat(src, "zoneinfo", directory_flags);
+    int fd = zoneinfo < 0 ? -1
+                          : openat(zoneinfo, "+VERSION", O_RDONLY | O_NOFOLLOW | O_NONBLOCK |
+                                                             O_CLOEXEC);
     struct stat st;
-    std::string release = source_release(src);
-    if (fstatat(src, "zoneinfo", &st, 0) != 0 || !S_ISDIR(st.st_mode))
-        found.push_back(problem("error", "source-no-zoneinfo", name + "/zoneinfo",
-                                name + "/zoneinfo is no directory: the update has no tz database.",
-                                "the compiled tz database in " + name + "/zoneinfo"));
-    else if (release.empty())
-        found.push_back(problem("error", "source-no-release", name + "/zoneinfo/+VERSION",
-                                name + "/zoneinfo/+VERSION names no release: what the update "
-                                       "holds cannot be told.",
-                                "the release, such as 2025b, as the first word of " + name +
-                                    "/zoneinfo/+VERSION"));
-    else if (match.size == 5 && release != match.group[1] + match.group[2])
-        found.push_back(problem("error", "source-release-mismatch", name + "/zoneinfo/+VERSION",
-                                "The update holds the tz database " + release + ", but " + version +
-                                    " says " + match.group[1] + match.group[2] + ".",
-                                "--as " + release + ".1.0, or the tz database of release " +
-                                    match.group[1] + match.group[2]));
-    std::string data = icu_data_in(src);
-    std::string head = data.empty() ? "" : start_of(src, "icutz/" + data, 4).value_or("");
-    if (data.empty())
-        found.push_back(
-            problem("error", "source-no-icu", name + "/icutz",
-                    name + "/icutz holds no ICU data the boot can use: a regular "
-                           "file icutz<schema>.dat, readable by others.",
-                    "the update's ICU data, such as icutz44l.dat, in " + name + "/icutz"));
-    else if (head.size() < 4 || head.compare(2, 2, "\xda\x27") != 0)
-        found.push_back(problem("error", "source-icu-bad", name + "/icutz/" + data,
-                                name + "/icutz/" + data +
-                                    (head.empty() ? " is empty"
-                                                  : " is no ICU data (it lacks the header ICU's "
-                                                    "data files begin with)") +
-                                    ": ICU's readers would fail.",
-                                "ICU data built by ICU's tools as " + name + "/icutz/" + data));
-    if (!zone.empty() && fstatat(src, "zoneinfo", &st, 0) == 0 && S_ISDIR(st.st_mode) &&
-        start_of(src, "zoneinfo/" + zone, 4).value_or("").compare(0, 4, "TZif") != 0)
-        found.push_back(problem("warning", "source-lacks-zone", name + "/zoneinfo/" + zone,
-                                name + "/zoneinfo/" + zone +
-                                    ", the device's zone, is no zone "
-                                    "file: once it is in use, the "
-                                    "device's localtime leads nowhere.",
-                                "the zone " + zone + " in " + name + "/zoneinfo"));
-    size_t unsafe = 0;
-    walk(src, "", 0, name, found, unsafe);
-    if (unsafe > most_unsafe)
-        found.push_back(problem("error", "source-unsafe", name,
-                                std::to_string(unsafe - most_unsafe) + " more entries of " + name +
-                                    " are no directory, regular "
-                                    "file or link inside it.",
-                                name + " without them"));
-    return found;
+    std::string word;
+    if (fd >= 0 && fstat(fd, &st) == 0 && S_ISREG(st.st_mode))
+        (void)first_word_of(fd, word, 256);
+    for (int open : {fd, zoneinfo}) {
+        if (open >= 0)
+            (void)close(open);
+    }
+    return word;
 }

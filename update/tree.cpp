@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// Whole directory trees, each below a directory descriptor: copied, compared
-// and removed without ever following a link.
 #include "update/tree.h"
+
+#include "support/fs.h"
 
 #include <cerrno>
 #include <cstring>
 #include <dirent.h>
-#include <err.h>
 #include <fcntl.h>
 #include <set>
 #include <sys/stat.h>
@@ -14,143 +13,173 @@
 
 static const int directory_flags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
-std::vector<std::string>
-names_in(int dir)
+int
+names_in(int dir, std::vector<std::string>& names)
 {
-    std::vector<std::string> names;
-    int listing = dup(dir);
+    int listing = openat(dir, ".", directory_flags);
     DIR* entries = listing < 0 ? nullptr : fdopendir(listing);
-    if (entries == nullptr && listing >= 0)
-        (void)close(listing);
-    // A duplicate shares the position of a listing made before.
-    if (entries != nullptr)
-        rewinddir(entries);
+    if (entries == nullptr) {
+        int error = errno;
+        if (listing >= 0)
+            (void)close(listing);
+        return error;
+    }
+    errno = 0;
     // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* entry = entries != nullptr ? readdir(entries) : nullptr) {
+    while (const struct dirent* entry = readdir(entries)) {
         if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0)
             names.emplace_back(entry->d_name);
     }
-    if (entries != nullptr)
-        closedir(entries);
-    return names;
+    int error = errno;
+    closedir(entries);
+    return error;
 }
 
-// A file's bytes into a new file of the same permission bits.
-static bool
-copy_file(int from, const char* name, int to, mode_t mode)
-{
-    int in = openat(from, name, O_RDONLY | O_NOFOLLOW | O_CLOEXEC);
-    int out =
-        in < 0 ? -1 : openat(to, name, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600);
-    bool copied = out >= 0;
-    char buffer[65536];
-    for (ssize_t n; copied && (n = read(in, buffer, sizeof buffer)) != 0;)
-        copied = n > 0 && write(out, buffer, static_cast<size_t>(n)) == n;
-    copied = copied && fchmod(out, mode & 0777) == 0;
-    if (out >= 0 && close(out) != 0)
-        copied = false;
-    if (in >= 0)
-        (void)close(in);
-    return copied;
-}
-
-bool
-copy_into(int from, int to)
-{
-    for (const std::string& name : names_in(from)) {
-        struct stat st;
-        bool copied = fstatat(from, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) == 0;
-        if (copied && S_ISDIR(st.st_mode)) {
-            // Writable until filled; its own permission bits last.
-            int in = -1, out = -1;
-            copied = mkdirat(to, name.c_str(), 0700) == 0 &&
-                     (in = openat(from, name.c_str(), directory_flags)) >= 0 &&
-                     (out = openat(to, name.c_str(), directory_flags)) >= 0 && copy_into(in, out) &&
-                     fchmod(out, st.st_mode & 0777) == 0;
-            for (int fd : {in, out}) {
-                if (fd >= 0)
-                    (void)close(fd);
-            }
-        } else if (copied && S_ISLNK(st.st_mode)) {
-            std::string target(static_cast<size_t>(st.st_size) + 1, '\0');
-            ssize_t n = readlinkat(from, name.c_str(), target.data(), target.size());
-            copied = n >= 0 && static_cast<size_t>(n) < target.size();
-            target.resize(copied ? static_cast<size_t>(n) : 0);
-            copied = copied && symlinkat(target.c_str(), to, name.c_str()) == 0;
-        } else if (copied) {
-            copied = S_ISREG(st.st_mode) && copy_file(from, name.c_str(), to, st.st_mode);
-        }
-        if (!copied) {
-            warn("cannot copy %s", name.c_str());
-            return false;
-        }
-    }
-    return true;
-}
-
-static bool
+// Whether two open files hold the same bytes: 1, 0, or -1.
+static int
 same_file(int a, int b)
 {
     char left[65536], right[65536];
     for (;;) {
         ssize_t n = read(a, left, sizeof left), m = read(b, right, sizeof right);
-        if (n != m || n < 0)
-            return false;
+        if (n < 0 || m < 0)
+            return -1;
+        if (n != m || memcmp(left, right, static_cast<size_t>(n)) != 0)
+            return 0;
         if (n == 0)
-            return true;
-        if (memcmp(left, right, static_cast<size_t>(n)) != 0)
-            return false;
+            return 1;
     }
 }
 
-bool
+// Whether the entry name is the same below both: 1, 0, or -1.
+static int
+same_entry(int a, int b, const std::string& name)
+{
+    struct stat x, y;
+    if (fstatat(a, name.c_str(), &x, AT_SYMLINK_NOFOLLOW) != 0 ||
+        fstatat(b, name.c_str(), &y, AT_SYMLINK_NOFOLLOW) != 0)
+        return errno == ENOENT ? 0 : -1;
+    if (x.st_mode != y.st_mode)
+        return 0;
+    if (S_ISLNK(x.st_mode)) {
+        std::string left, right;
+        if (velm_fs::read_link_at(a, name, left) != 0 || velm_fs::read_link_at(b, name, right) != 0)
+            return -1;
+        return left == right ? 1 : 0;
+    }
+    int flags = S_ISDIR(x.st_mode) ? directory_flags : O_RDONLY | O_NOFOLLOW | O_CLOEXEC;
+    int fa = openat(a, name.c_str(), flags), fb = openat(b, name.c_str(), flags);
+    int same = fa < 0 || fb < 0 ? -1 : S_ISDIR(x.st_mode) ? same_content(fa, fb) : same_file(fa, fb);
+    int error = errno;
+    for (int fd : {fa, fb}) {
+        if (fd >= 0)
+            (void)close(fd);
+    }
+    errno = error;
+    return same;
+}
+
+int
 same_content(int a, int b)
 {
-    std::vector<std::string> names = names_in(a), others = names_in(b);
+    std::vector<std::string> names, others;
+    if (names_in(a, names) != 0 || names_in(b, others) != 0)
+        return -1;
     if (std::set<std::string>(names.begin(), names.end()) !=
         std::set<std::string>(others.begin(), others.end()))
-        return false;
+        return 0;
     for (const std::string& name : names) {
-        struct stat x, y;
-        if (fstatat(a, name.c_str(), &x, AT_SYMLINK_NOFOLLOW) != 0 ||
-            fstatat(b, name.c_str(), &y, AT_SYMLINK_NOFOLLOW) != 0 ||
-            (x.st_mode & S_IFMT) != (y.st_mode & S_IFMT))
-            return false;
-        int flags = S_ISDIR(x.st_mode) ? directory_flags : O_RDONLY | O_NOFOLLOW | O_CLOEXEC;
-        bool same = true;
-        if (S_ISLNK(x.st_mode)) {
-            char left[4096], right[4096];
-            ssize_t n = readlinkat(a, name.c_str(), left, sizeof left);
-            ssize_t m = readlinkat(b, name.c_str(), right, sizeof right);
-            same = n == m && n >= 0 && memcmp(left, right, static_cast<size_t>(n)) == 0;
-        } else {
-            int fa = openat(a, name.c_str(), flags), fb = openat(b, name.c_str(), flags);
-            same =
-                fa >= 0 && fb >= 0 && (S_ISDIR(x.st_mode) ? same_content(fa, fb) : same_file(fa, fb));
-            for (int fd : {fa, fb}) {
-                if (fd >= 0)
-                    (void)close(fd);
-            }
-        }
-        if (!same)
-            return false;
+        if (int same = same_entry(a, b, name); same != 1)
+            return same;
     }
-    return true;
+    return 1;
 }
 
-bool
-remove_all(int dir, const std::string& name)
+// Empties the directory fd of everything but directories on its file
+// system, which it lists in below: 0, or the first errno.
+static int
+clear_files(int fd, dev_t device, std::vector<std::string>& below, std::string& failed)
 {
-    struct stat st;
-    if (fstatat(dir, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
-        return errno == ENOENT;
-    if (!S_ISDIR(st.st_mode))
-        return unlinkat(dir, name.c_str(), 0) == 0 || errno == ENOENT;
-    int fd = openat(dir, name.c_str(), directory_flags);
-    bool removed = fd >= 0;
-    for (const std::string& child : removed ? names_in(fd) : std::vector<std::string>())
-        removed = remove_all(fd, child) && removed;
+    std::vector<std::string> names;
+    int error = names_in(fd, names);
+    for (const std::string& name : names) {
+        struct stat st;
+        int now = 0;
+        if (fstatat(fd, name.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
+            now = errno == ENOENT ? 0 : errno;
+        else if (S_ISDIR(st.st_mode) && st.st_dev == device)
+            below.push_back(name);
+        else if (unlinkat(fd, name.c_str(), S_ISDIR(st.st_mode) ? AT_REMOVEDIR : 0) != 0)
+            now = S_ISDIR(st.st_mode) ? EBUSY : errno; // a mount point
+        if (now != 0 && error == 0)
+            error = now, failed = name;
+    }
+    return error;
+}
+
+static std::string
+joined(const std::vector<std::string>& path)
+{
+    std::string out;
+    for (const std::string& step : path)
+        out += (out.empty() ? "" : "/") + step;
+    return out;
+}
+
+// Depth first without recursion: one directory open at a time, however
+// deep the tree, going back up by "..", which cannot lead elsewhere while
+// the lock is held, and is checked all the same.
+int
+remove_all(int dir, const std::string& name, std::string* failed)
+{
+    struct stat top;
+    if (fstatat(dir, name.c_str(), &top, AT_SYMLINK_NOFOLLOW) != 0)
+        return errno == ENOENT ? 0 : errno;
+    if (!S_ISDIR(top.st_mode))
+        return unlinkat(dir, name.c_str(), 0) == 0 || errno == ENOENT ? 0 : errno;
+    std::vector<std::string> path = {name}; // the directories walked down
+    std::vector<ino_t> inodes = {top.st_ino};
+    int fd = openat(dir, name.c_str(), directory_flags), error = fd < 0 ? errno : 0;
+    while (fd >= 0) {
+        std::vector<std::string> below;
+        std::string entry;
+        if (int now = clear_files(fd, top.st_dev, below, entry); now != 0 && error == 0) {
+            error = now;
+            if (failed != nullptr)
+                *failed = joined(path) + "/" + entry;
+        }
+        struct stat st;
+        int next = below.empty() ? openat(fd, "..", directory_flags)
+                                 : openat(fd, below.front().c_str(), directory_flags);
+        bool down = !below.empty();
+        (void)close(fd);
+        fd = next;
+        if (fd < 0 || fstat(fd, &st) != 0) {
+            error = error != 0 ? error : errno;
+            break;
+        }
+        if (down) {
+            path.push_back(below.front()), inodes.push_back(st.st_ino);
+            continue;
+        }
+        // Back up one level: the directory just emptied goes, unless
+        // something in it could not.
+        bool home = path.size() == 1;
+        if (!home && st.st_ino != inodes[inodes.size() - 2]) {
+            error = error != 0 ? error : ESTALE;
+            break;
+        }
+        int parent = home ? dir : fd;
+        if (error == 0 && unlinkat(parent, path.back().c_str(), AT_REMOVEDIR) != 0) {
+            error = errno;
+            if (failed != nullptr)
+                *failed = joined(path);
+        }
+        path.pop_back(), inodes.pop_back();
+        if (home || error != 0)
+            break;
+    }
     if (fd >= 0)
         (void)close(fd);
-    return removed && (unlinkat(dir, name.c_str(), AT_REMOVEDIR) == 0 || errno == ENOENT);
+    return error == ENOENT ? 0 : error;
 }

@@ -1,59 +1,79 @@
 // SPDX-License-Identifier: Apache-2.0
-// tzlinks-update: puts an update on a device safely, judged before it is
-// placed by the boot's own code on a simulation of the device.
+// tzlinks-update: puts an update on a device safely, judged by the boot's
+// own code run on a simulation of the device with the update in place.
 #ifndef TZLINKS_UPDATE_UPDATE_H
 #define TZLINKS_UPDATE_UPDATE_H
 
-#include "status/report.h"
+#include "device/boot.h"
+#include "device/device.h"
 
+#include <optional>
 #include <string>
 #include <vector>
 
-// Exit statuses beyond the usage (64), an unreadable SRC (66), a failed
-// write (74) and a lock held too long (75).
+// The verdicts of check, its exit statuses.
 enum velm_verdict { adopted_clean = 0, adopted_with_warnings = 1, refused = 2 };
 
-// Where the program works: the device's own tree, or one below --root DIR.
-struct velm_device {
-    std::string root; // DIR, as commands and messages name it; "" for the device
-    int fd = -1;      // the tree's root directory
-    // A path of the device, as the system calls reach it.
-    std::string at(const std::string& path) const { return root + path; }
+// What makes an update unusable (an error, which nothing overrides) or not
+// the device's (a warning: the boot's judgement, which --force overrides).
+struct velm_problem {
+    std::string id, severity, subject, message, manual;
 };
 
-// An update as it is to be unpacked, and what the next boot makes of it.
-struct velm_judgement {
-    std::string version;                // the name it takes below tz/
-    std::vector<velm_finding> problems; // errors: unusable; warnings: the boot refuses it
-    velm_run next_boot;                 // with the update staged and named by tz_latest
-    bool adopts = false;                // that boot adopts it
-    velm_report then;                   // the device after that boot
-    velm_verdict verdict = refused;
+// What a walk of SRC found: its problems, and its links (paths below it),
+// to be judged where they lead once the update is in place.
+struct velm_source {
+    std::vector<velm_problem> problems;
+    std::vector<std::string> links;
+    size_t unsafe = 0;
+    unsigned long long bytes = 0;
 };
 
-// What makes the update below src unusable (errors) or not the device's
-// (warnings): its version, its layout, its ICU data, the device's zone.
-std::vector<velm_finding> examine_source(int src, const std::string& name,
-                                         const std::string& version, const std::string& zone);
-// The release an update's tz database names: the first word of its
+// Walks the tree below src, by descriptor and never following a link,
+// and copies it into the empty directory to: directories 0755, files 0644,
+// links as they read; what is unsafe to copy is left out, and a problem.
+// name is how SRC is named. False when the copy could not be written,
+// said on standard error.
+bool walk_source(int src, int to, const std::string& name, velm_source& found);
+// An entry of SRC, at path below it, that makes it unsafe; and the line
+// that counts those beyond the first few.
+void note_unsafe(velm_source& found, const std::string& name, const std::string& path,
+                 const std::string& why);
+void finish_unsafe(velm_source& found, const std::string& name);
+// The release SRC's tz database names: the first word of its
 // zoneinfo/+VERSION; "" when there is none.
 std::string source_release(int src);
 
-// Judges the update below src, staged as version on the device.
-velm_judgement judge(const velm_device& device, int src, const std::string& name,
-                     const std::string& version);
-std::string judgement_text(const velm_judgement& j, const std::string& name,
-                           const velm_device& device);
-std::string judgement_json(const velm_judgement& j, const std::string& name,
-                           const velm_device& device);
+// An update, and what the next boot makes of it.
+struct velm_judgement {
+    std::string version;                // the name it takes below tz/
+    std::vector<velm_problem> problems; // of SRC, then the boot's refusal
+    velm_run next_boot;                 // with the update in place and named
+    bool adopts = false;                // that boot adopts it
+    std::optional<velm_run> after;      // the boot after it, when it does
+    velm_verdict verdict = refused;
+    std::string unread; // a path of the device that could not be read
+    int error = 0;      // and why: nothing is judged on it
+};
 
-// Takes the lock of the update tool's changes, waiting at most seconds:
-// 0, or 75 (the holder named) when it is still held then, 74 on failure.
-int take_lock(const velm_device& device, int seconds);
+// Judges the update below fd (SRC, or its staged copy) as version.
+velm_judgement judge(const velm_device& device, int fd, const velm_source& walked,
+                     const std::string& name, const std::string& version);
+bool unusable(const velm_judgement& j);
+std::string judgement_text(const velm_judgement& j, const std::string& name);
+std::string judgement_json(const velm_judgement& j, const std::string& name);
+
+// Takes the lock of tzlinks-update's changes in the link directory links,
+// waiting at most seconds: 0, or EX_TEMPFAIL when it is still held (its
+// holder named when that can be told), EX_IOERR when it cannot be taken.
+// A lock entry that is no regular file wedges every caller: with clear,
+// it is removed first.
+int take_lock(const velm_device& device, int links, int seconds, bool clear);
 
 // Copies src into tz/version and names it with tz_latest; the exit status.
-int stage(const velm_device& device, int src, const std::string& version);
+int stage(const velm_device& device, int links, int src, const std::string& name,
+          const std::string& version, bool force);
 // Removes what no link names below tz/, and what an interrupted stage left.
-int prune(const velm_device& device, bool dry_run);
+int prune(const velm_device& device, int links, bool dry_run);
 
 #endif

@@ -1,0 +1,46 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "device/data.h"
+
+#include "dataset/first_word.h"
+#include "dataset/icu.h"
+#include "support/paths.h"
+#include "support/prefix.h"
+
+std::string
+velm_update_of(const std::string& path)
+{
+    static const size_t prefix = sizeof velm_path::updates - 1;
+    if (path.size() <= prefix || !has_prefix(path, velm_path::updates) || path[prefix] == '/')
+        return "";
+    return path.substr(0, path.find('/', prefix));
+}
+
+std::string
+velm_first_word(velm_simulation& tree, const std::string& path)
+{
+    velm_calls_in_use simulated(tree);
+    std::string word;
+    read_first_word(path, word);
+    return word;
+}
+
+std::string
+velm_icu_file(velm_simulation& tree, const std::string& directory)
+{
+    velm_calls_in_use simulated(tree);
+    std::string name = velm_icu_data_file(directory);
+    return name.empty() ? "" : directory + "/" + name;
+}
+
+bool
+velm_zone_file(velm_simulation& tree, const std::string& path)
+{
+    return tree.read(path, 4) == "TZif";
+}
+
+bool
+velm_icu_data(velm_simulation& tree, const std::string& path)
+{
+    std::string head = tree.read(path, 4).value_or("");
+    return head.size() == 4 && head.compare(2, 2, "\xda\x27") == 0;
+}
