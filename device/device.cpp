@@ -11,8 +11,20 @@
 #include <sysexits.h>
 #include <unistd.h>
 
+std::string
+velm_device::real(const std::string& path) const
+{
+    size_t slash = path.rfind('/');
+    velm_simulation tree(fd);
+    std::string canonical;
+    if (root.empty() || slash == 0 || slash == std::string::npos ||
+        tree.look(path.substr(0, slash), true, &canonical).kind != velm_entry::directory)
+        return path;
+    return canonical + path.substr(slash);
+}
+
 int
-velm_device::open_directory(const std::string& path) const
+velm_device::open_directory(const std::string& path, std::string* real) const
 {
     velm_simulation tree(fd);
     std::string canonical;
@@ -23,6 +35,8 @@ velm_device::open_directory(const std::string& path) const
                                                    : ENOTDIR;
         return -1;
     }
+    if (real != nullptr)
+        *real = root + canonical;
     int directory = openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     for (size_t at = 1; directory >= 0 && at < canonical.size();) {
         size_t end = std::min(canonical.find('/', at), canonical.size());

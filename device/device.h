@@ -16,13 +16,19 @@ struct velm_device {
     std::string root; // how commands and messages name the tree: "" for /
     int fd = -1;      // the root directory
 
-    // A path of the device as messages and commands name it.
-    std::string named(const std::string& path) const { return root + path; }
+    // A path of the device as it lies in the tree below a root: the
+    // directory it lies in resolved inside the root, since the host, given
+    // DIR/path, would follow an absolute link on its way out of DIR. The
+    // device's own paths stay as they are.
+    std::string real(const std::string& path) const;
+    // A path of the device as messages and commands name it to the host.
+    std::string named(const std::string& path) const { return root + real(path); }
     // The directory at path, opened for real: resolved inside the root,
     // then opened name by name without following any link, so that what a
     // racing change made a link is refused (ELOOP, ENOTDIR) rather than
-    // followed. -1 and errno when it cannot be opened.
-    int open_directory(const std::string& path) const;
+    // followed. -1 and errno when it cannot be opened. real, when given,
+    // gets the path it has below the root, as the host names it.
+    int open_directory(const std::string& path, std::string* real = nullptr) const;
 };
 
 // Opens the tree below dir, or the device's own when dir is null: 0, or

@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
 #include <linux/fs.h>
@@ -32,11 +31,23 @@ parent_of(const std::string& canonical)
     return canonical.substr(0, std::min(canonical.rfind('/'), canonical.size()));
 }
 
+// The flags of the file system a real entry lies on (ST_RDONLY, ST_NODEV).
+static unsigned long
+mount_flags(const velm_entry& entry)
+{
+    int fd = openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
+    struct statvfs fs = {};
+    bool known = fd >= 0 && fstatvfs(fd, &fs) == 0;
+    if (fd >= 0)
+        (void)close(fd);
+    return known ? fs.f_flag : 0;
+}
+
 velm_simulation::velm_simulation(int root_fd) : root(root_fd), as_root(geteuid() == 0) {}
 
 velm_simulation::~velm_simulation()
 {
-    reset();
+    settle();
 }
 
 // The real tree never changes under a report, so each entry is looked at
@@ -47,32 +58,24 @@ velm_simulation::real_entry(int base, const std::string& real)
     auto known = looked.find({base, real});
     if (known != looked.end())
         return known->second;
-    velm_entry entry = look_up(base, real);
-    looked.emplace(std::make_pair(base, real), entry);
-    return entry;
-}
-
-velm_entry
-velm_simulation::look_up(int base, const std::string& real)
-{
     velm_entry entry;
     entry.base = base, entry.real = real;
     struct stat st;
     if (fstatat(base, relative(real).c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0) {
         entry.error = errno == ENOENT ? 0 : errno;
-        return entry;
+    } else {
+        if (S_ISLNK(st.st_mode))
+            entry.error = velm_fs::read_link_at(base, relative(real), entry.text);
+        entry.shared = S_ISREG(st.st_mode) && st.st_nlink > 1;
+        entry.mode = st.st_mode & 07777;
+        entry.kind = S_ISLNK(st.st_mode)    ? velm_entry::link
+                     : S_ISREG(st.st_mode)  ? velm_entry::file
+                     : S_ISDIR(st.st_mode)  ? velm_entry::directory
+                     : S_ISFIFO(st.st_mode) ? velm_entry::fifo
+                     : S_ISSOCK(st.st_mode) ? velm_entry::socket
+                                            : velm_entry::device;
     }
-    if (S_ISLNK(st.st_mode))
-        entry.error = velm_fs::read_link_at(base, relative(real), entry.text);
-    entry.shared = S_ISREG(st.st_mode) && st.st_nlink > 1;
-    entry.mode = st.st_mode & 07777;
-    entry.kind = S_ISLNK(st.st_mode)    ? velm_entry::link
-                 : S_ISREG(st.st_mode)  ? velm_entry::file
-                 : S_ISDIR(st.st_mode)  ? velm_entry::directory
-                 : S_ISFIFO(st.st_mode) ? velm_entry::fifo
-                 : S_ISSOCK(st.st_mode) ? velm_entry::socket
-                                        : velm_entry::device;
-    return entry;
+    return looked.emplace(std::make_pair(base, real), entry).first->second;
 }
 
 // The nearest change at or above a path decides what stands there: below a
@@ -95,32 +98,34 @@ velm_simulation::entry_at(const std::string& canonical)
     }
 }
 
+// The components of a path, the first last, as the walk below takes them.
+static void
+push(std::vector<std::string>& todo, const std::string& text)
+{
+    for (size_t end = text.size(); end > 0;) {
+        size_t slash = text.rfind('/', end - 1);
+        size_t begin = slash == std::string::npos ? 0 : slash + 1;
+        if (end > begin)
+            todo.push_back(text.substr(begin, end - begin));
+        end = slash == std::string::npos ? 0 : slash;
+    }
+}
+
 // Walks path a component at a time, following links (the last one only
-// when asked), an absolute target starting again from the root and ".."
-// never leaving it. Fails as the kernel would: ENOENT, ENOTDIR, ELOOP, or
-// what looking up an entry met.
+// when asked, or when a '/' ends the path), an absolute target starting
+// again from the root and ".." never leaving it. Fails as the kernel
+// would: ENOENT, ENOTDIR, ELOOP, or what looking up an entry met.
 velm_entry
 velm_simulation::resolve(const std::string& path, bool follow, std::string& canonical)
 {
     settle();
-    std::vector<std::string> todo; // components still to walk, the next one last
-    auto push = [&todo](const std::string& text) {
-        for (size_t end = text.size(); end > 0;) {
-            size_t slash = text.rfind('/', end - 1);
-            size_t begin = slash == std::string::npos ? 0 : slash + 1;
-            if (end > begin)
-                todo.push_back(text.substr(begin, end - begin));
-            end = slash == std::string::npos ? 0 : slash;
-        }
-    };
-    velm_entry failed;
-    failed.error = ENOENT;
+    velm_entry entry, failed;
+    entry.kind = velm_entry::directory, failed.error = ENOENT;
     if (path.empty())
         return failed;
-    push(path);
-    bool must_be_directory = path.back() == '/';
-    velm_entry entry;
-    entry.kind = velm_entry::directory;
+    std::vector<std::string> todo;
+    push(todo, path);
+    bool directory_asked = path.back() == '/';
     for (int links = 0; !todo.empty();) {
         std::string name = todo.back();
         todo.pop_back();
@@ -130,13 +135,12 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
             continue;
         std::string next = canonical + "/" + name;
         entry = entry_at(next);
-        bool last = todo.empty();
         if (entry.error != 0) {
             // Refused a look into a directory: the directory is what bars it.
             trouble.emplace(entry.error == EACCES ? canonical : next, entry.error);
             return entry;
         }
-        if (entry.kind == velm_entry::link && (!last || follow || must_be_directory)) {
+        if (entry.kind == velm_entry::link && (!todo.empty() || follow || directory_asked)) {
             failed.error = ++links > 40 ? ELOOP : entry.text.empty() ? ENOENT : 0;
             if (failed.error == ELOOP)
                 trouble.emplace(path, ELOOP);
@@ -144,17 +148,16 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
                 return failed;
             if (entry.text[0] == '/')
                 canonical.clear();
-            push(entry.text);
-            continue;
-        }
-        if (!last && entry.kind != velm_entry::directory) {
+            push(todo, entry.text);
+        } else if (!todo.empty() && entry.kind != velm_entry::directory) {
             failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
             return failed;
+        } else {
+            canonical = next;
         }
-        canonical = next;
     }
     failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
-    return must_be_directory && entry.kind != velm_entry::directory ? failed : entry;
+    return directory_asked && entry.kind != velm_entry::directory ? failed : entry;
 }
 
 velm_entry
@@ -192,64 +195,59 @@ velm_simulation::read(const std::string& path, size_t limit)
     return text;
 }
 
-// The names below a real directory; false when it cannot be listed whole.
-static bool
-list(int base, const std::string& real, std::set<std::string>& found)
+// The names below a real directory: 0, or the errno of a listing that
+// could not be made whole.
+static int
+list(const velm_entry& directory, std::set<std::string>& found)
 {
-    int fd = openat(base, relative(real).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    DIR* directory = fd < 0 ? nullptr : fdopendir(fd);
-    if (directory == nullptr) {
+    int fd = openat(directory.base, relative(directory.real).c_str(),
+                    O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    DIR* listing = fd < 0 ? nullptr : fdopendir(fd);
+    if (listing == nullptr) {
+        int error = errno;
         if (fd >= 0)
             (void)close(fd);
-        return false;
+        return error;
     }
     errno = 0;
     // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* child = readdir(directory))
+    while (const struct dirent* child = readdir(listing))
         found.insert(child->d_name);
     int error = errno;
-    closedir(directory);
+    closedir(listing);
     found.erase("."), found.erase("..");
-    errno = error;
-    return error == 0;
+    return error;
 }
 
-std::optional<std::vector<std::string>>
+std::optional<velm_names>
 velm_simulation::names(const std::string& path)
 {
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, true, canonical);
     std::set<std::string> found;
-    if (entry.kind != velm_entry::directory ||
-        (!entry.fresh && !list(entry.base, entry.real, found))) {
-        if (entry.kind == velm_entry::directory)
-            trouble.emplace(canonical, errno);
-        errno = saved;
-        return std::nullopt;
-    }
+    int error = entry.kind != velm_entry::directory ? -1 : entry.fresh ? 0 : list(entry, found);
+    if (error > 0)
+        trouble.emplace(canonical, error);
     // What the simulation changed right below it.
-    for (auto c = changed.lower_bound(canonical + "/"); c != changed.end(); ++c) {
-        if (c->first.compare(0, canonical.size() + 1, canonical + "/") != 0)
+    std::string prefix = canonical + "/";
+    for (auto c = changed.lower_bound(prefix); error == 0 && c != changed.end(); ++c) {
+        if (c->first.compare(0, prefix.size(), prefix) != 0)
             break;
-        std::string name = c->first.substr(canonical.size() + 1);
-        if (name.find('/') != std::string::npos)
-            continue;
-        if (c->second.kind == velm_entry::absent)
+        std::string name = c->first.substr(prefix.size());
+        if (name.find('/') == std::string::npos && c->second.kind == velm_entry::absent)
             found.erase(name);
-        else
+        else if (name.find('/') == std::string::npos)
             found.insert(name);
     }
     errno = saved;
-    return std::vector<std::string>(found.begin(), found.end());
+    return error != 0 ? std::nullopt : std::optional<velm_names>(velm_names(found.begin(), found.end()));
 }
 
 void
 velm_simulation::io_failed(const std::string& path, int error)
 {
-    int saved = errno;
     trouble.emplace(where(path, true), error);
-    errno = saved;
 }
 
 velm_simulation::changes
@@ -266,22 +264,25 @@ velm_simulation::rewind(const changes& to)
     changed = to;
 }
 
-std::string
-velm_simulation::where(const std::string& path, bool follow)
+void
+velm_simulation::put(const std::string& canonical, const velm_entry& made)
 {
-    int saved = errno;
-    std::string canonical;
-    resolve(path, follow, canonical);
-    errno = saved;
-    return canonical;
+    settle();
+    changed[canonical] = made;
+}
+
+void
+velm_simulation::graft(const std::string& path, int outside)
+{
+    velm_entry copy;
+    copy.kind = velm_entry::directory, copy.base = outside;
+    put(where(path), copy);
 }
 
 bool
 velm_simulation::written(const std::string& path)
 {
-    std::string canonical;
-    resolve(path, false, canonical);
-    return writes.count(canonical) != 0;
+    return writes.count(where(path)) != 0;
 }
 
 void
@@ -316,16 +317,10 @@ velm_simulation::settle()
     pending.clear();
 }
 
-void
-velm_simulation::reset()
-{
-    settle();
-    changed.clear(), writes.clear(), trouble.clear();
-}
-
-// Whether the boot may add or remove entries in a directory: 0, or the
-// error the kernel gives it (EROFS, EPERM for an immutable directory,
-// EACCES). A new directory lies on the file system of the real one above.
+// Each call below leaves errno as the real call would: untouched on
+// success, whatever the lookups inside it did; on failure, the first error
+// in the kernel's own order of checks. A new directory lies on the file
+// system of the real one above it.
 int
 velm_simulation::may_change_in(const std::string& directory)
 {
@@ -334,75 +329,56 @@ velm_simulation::may_change_in(const std::string& directory)
     while (entry.fresh || entry.kind != velm_entry::directory) {
         if (at.empty())
             return 0;
-        at = parent_of(at);
-        entry = entry_at(at);
+        entry = entry_at(at = parent_of(at));
     }
-    std::string path = relative(entry.real);
-    int fd = openat(entry.base, path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC);
-    struct statvfs fs = {};
-    bool read_only = fd >= 0 && fstatvfs(fd, &fs) == 0 && (fs.f_flag & ST_RDONLY) != 0;
-    if (fd >= 0)
-        (void)close(fd);
-    if (read_only)
+    if ((mount_flags(entry) & ST_RDONLY) != 0)
         return EROFS;
     if (!as_root || at != directory)
         return 0;
-    return faccessat(entry.base, path.c_str(), W_OK | X_OK, AT_EACCESS) == 0 ? 0 : errno;
+    return faccessat(entry.base, relative(entry.real).c_str(), W_OK | X_OK, AT_EACCESS) == 0
+               ? 0
+               : errno;
 }
 
-// Whether the boot may open an existing entry for writing.
+// Whether the boot may open an existing entry for writing. Another user
+// than root foresees a read-only file system alone.
 int
-velm_simulation::may_write(const velm_entry& entry, int mode)
+velm_simulation::may_write(const velm_entry& entry)
 {
     if (entry.fresh)
         return 0;
-    std::string path = relative(entry.real);
-    if (!as_root) {
-        int fd = openat(entry.base, path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
-        struct statvfs fs = {};
-        bool read_only = fd >= 0 && fstatvfs(fd, &fs) == 0 && (fs.f_flag & ST_RDONLY) != 0;
-        if (fd >= 0)
-            (void)close(fd);
-        return read_only && entry.kind == velm_entry::file ? EROFS : 0;
-    }
-    return faccessat(entry.base, path.c_str(), mode, AT_EACCESS | AT_SYMLINK_NOFOLLOW) == 0 ? 0
-                                                                                            : errno;
+    if (!as_root)
+        return entry.kind == velm_entry::file && (mount_flags(entry) & ST_RDONLY) != 0 ? EROFS : 0;
+    return faccessat(entry.base, relative(entry.real).c_str(), W_OK,
+                     AT_EACCESS | AT_SYMLINK_NOFOLLOW) == 0
+               ? 0
+               : errno;
 }
-
-// An immutable or append-only file or directory cannot be removed.
-bool
-velm_simulation::unremovable(const velm_entry& entry)
-{
-    if (entry.fresh || (entry.kind != velm_entry::file && entry.kind != velm_entry::directory))
-        return false;
-    int fd = openat(entry.base, relative(entry.real).c_str(),
-                    O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
-    int flags = 0;
-    bool got = fd >= 0 && ioctl(fd, FS_IOC_GETFLAGS, &flags) == 0;
-    if (fd >= 0)
-        (void)close(fd);
-    return got && (flags & (FS_IMMUTABLE_FL | FS_APPEND_FL)) != 0;
-}
-
-// Each call below leaves errno as the real call would: untouched on
-// success, whatever the lookups inside it did; on failure, the first error
-// in the kernel's own order of checks.
 
 // What the kernel checks, in its order, before it removes an entry by
-// unlink or rmdir alike: 0 when nothing stands in the way.
+// unlink or rmdir alike: 0 when nothing stands in the way. An immutable or
+// append-only file or directory cannot be removed.
 int
 velm_simulation::may_remove(const char* path, std::string& canonical, velm_entry& entry)
 {
     entry = resolve(path, false, canonical);
     if (entry.error != 0)
         return entry.error;
-    if (int error = may_change_in(parent_of(canonical)); error == EROFS)
+    int error = may_change_in(parent_of(canonical));
+    if (error == EROFS)
         return error;
     if (entry.kind == velm_entry::absent)
         return ENOENT;
-    if (int error = may_change_in(parent_of(canonical)); error != 0)
+    if (error != 0 || entry.fresh ||
+        (entry.kind != velm_entry::file && entry.kind != velm_entry::directory))
         return error;
-    return unremovable(entry) ? EPERM : 0;
+    int fd = openat(entry.base, relative(entry.real).c_str(),
+                    O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+    int flags = 0;
+    bool got = fd >= 0 && ioctl(fd, FS_IOC_GETFLAGS, &flags) == 0;
+    if (fd >= 0)
+        (void)close(fd);
+    return got && (flags & (FS_IMMUTABLE_FL | FS_APPEND_FL)) != 0 ? EPERM : 0;
 }
 
 int
@@ -433,8 +409,7 @@ int
 velm_simulation::access(const char* path)
 {
     int saved = errno;
-    std::string canonical;
-    velm_entry entry = resolve(path, true, canonical);
+    velm_entry entry = look(path, true);
     if (entry.error != 0 || entry.kind == velm_entry::absent)
         return fail(entry.error != 0 ? entry.error : ENOENT);
     errno = saved;
@@ -445,12 +420,11 @@ ssize_t
 velm_simulation::readlink(const char* path, char* buffer, size_t size)
 {
     int saved = errno;
-    std::string canonical;
-    velm_entry entry = resolve(path, false, canonical);
-    if (entry.error != 0 || entry.kind == velm_entry::absent)
-        return fail(entry.error != 0 ? entry.error : ENOENT);
-    if (entry.kind != velm_entry::link)
-        return fail(EINVAL);
+    velm_entry entry = look(path);
+    if (entry.error != 0 || entry.kind != velm_entry::link)
+        return fail(entry.error != 0                        ? entry.error
+                    : entry.kind == velm_entry::absent ? ENOENT
+                                                       : EINVAL);
     size_t n = entry.text.copy(buffer, size);
     errno = saved;
     return static_cast<ssize_t>(n);
@@ -462,10 +436,10 @@ velm_simulation::symlink(const char* target, const char* path)
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, false, canonical);
-    int error = *target == '\0'                          ? ENOENT
-                : entry.error != 0                       ? entry.error
-                : entry.kind != velm_entry::absent       ? EEXIST
-                                                         : may_change_in(parent_of(canonical));
+    int error = *target == '\0'                    ? ENOENT
+                : entry.error != 0                 ? entry.error
+                : entry.kind != velm_entry::absent ? EEXIST
+                                                   : may_change_in(parent_of(canonical));
     if (error != 0) {
         refusals.emplace_back(path, error);
         return fail(error);
@@ -477,38 +451,25 @@ velm_simulation::symlink(const char* target, const char* path)
     return 0;
 }
 
-// What the simulated run removes below a directory before it removes the
-// directory itself is already in the listing.
-bool
-velm_simulation::empty_directory(const std::string& canonical)
-{
-    auto listed = names(canonical);
-    return listed && listed->empty();
-}
-
+// As the C library does it: unlink, and rmdir when that meets a directory,
+// which leaves unlink's EISDIR in errno. What the simulated run removed
+// below the directory before is already gone from its listing.
 int
-velm_simulation::rmdir(const char* path)
+velm_simulation::remove(const char* path)
 {
-    int saved = errno;
+    int removed = unlink_entry(path), saved = errno;
+    if (removed == 0 || errno != EISDIR)
+        return removed;
     std::string canonical;
     velm_entry entry;
     if (int error = may_remove(path, canonical, entry); error != 0)
         return fail(error);
-    if (entry.kind != velm_entry::directory)
-        return fail(ENOTDIR);
-    if (!empty_directory(canonical))
+    auto listed = names(canonical);
+    if (!listed || !listed->empty())
         return fail(ENOTEMPTY);
     changed[canonical] = velm_entry();
     errno = saved;
     return 0;
-}
-
-// As the C library does it: unlink, and rmdir when that meets a directory.
-int
-velm_simulation::remove(const char* path)
-{
-    int removed = unlink_entry(path);
-    return removed == 0 || errno != EISDIR ? removed : rmdir(path);
 }
 
 // An anonymous file holding text, open for reading and writing.
@@ -530,32 +491,24 @@ anonymous_file(const std::string& text)
 static int
 description_of(const velm_entry& entry)
 {
-    int fd = openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
-    struct statvfs fs = {};
-    if (fd >= 0 && entry.kind == velm_entry::device && fstatvfs(fd, &fs) == 0 &&
-        (fs.f_flag & ST_NODEV) != 0) {
-        (void)close(fd);
+    if (entry.kind == velm_entry::device && (mount_flags(entry) & ST_NODEV) != 0) {
         errno = EACCES;
         return -1;
     }
-    return fd;
+    return openat(entry.base, relative(entry.real).c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC);
 }
 
 int
 velm_simulation::open_for_writing(const std::string& canonical, const velm_entry& entry)
 {
-    if (entry.kind == velm_entry::absent) {
-        if (int error = may_change_in(parent_of(canonical)); error != 0)
-            return fail(error);
-    } else if (entry.kind == velm_entry::link) {
-        return fail(ELOOP);
-    } else if (entry.kind == velm_entry::directory) {
-        return fail(EISDIR);
-    } else if (int error = may_write(entry, W_OK); error != 0) {
+    int error = entry.kind == velm_entry::absent      ? may_change_in(parent_of(canonical))
+                : entry.kind == velm_entry::link      ? ELOOP
+                : entry.kind == velm_entry::directory ? EISDIR
+                                                      : may_write(entry);
+    if (error == 0 && (entry.kind == velm_entry::fifo || entry.kind == velm_entry::socket))
+        error = ENXIO; // a FIFO has no reader at boot
+    if (error != 0)
         return fail(error);
-    } else if (entry.kind == velm_entry::fifo || entry.kind == velm_entry::socket) {
-        return fail(ENXIO); // a FIFO has no reader at boot
-    }
     if (entry.kind == velm_entry::device || entry.shared)
         return description_of(entry);
     std::optional<std::string> text = entry.fresh ? entry.text : read(canonical, longest_read);
@@ -585,12 +538,10 @@ velm_simulation::open_for_reading(const std::string& canonical, const velm_entry
                    : openat(root, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     int fd = openat(entry.base, relative(entry.real).c_str(),
                     O_RDONLY | O_NONBLOCK | O_CLOEXEC | (flags & O_DIRECTORY));
-    if (fd < 0) {
-        trouble.emplace(canonical, errno);
-        return -1;
-    }
     struct stat st;
-    if (fstat(fd, &st) != 0 || !S_ISREG(st.st_mode) ||
+    if (fd < 0)
+        trouble.emplace(canonical, errno);
+    if (fd < 0 || fstat(fd, &st) != 0 || !S_ISREG(st.st_mode) ||
         st.st_size <= static_cast<off_t>(longest_read))
         return fd;
     std::string start(longest_read, '\0');
@@ -617,21 +568,4 @@ velm_simulation::open(const char* path, int flags, mode_t /*mode*/)
     if (fd >= 0)
         errno = saved;
     return fd;
-}
-
-void
-velm_simulation::put(const std::string& canonical, const velm_entry& made)
-{
-    settle();
-    changed[canonical] = made;
-}
-
-void
-velm_simulation::graft(const std::string& path, int outside)
-{
-    std::string canonical;
-    resolve(path, false, canonical);
-    velm_entry copy;
-    copy.kind = velm_entry::directory, copy.base = outside;
-    changed[canonical] = copy;
 }

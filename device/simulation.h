@@ -55,7 +55,7 @@ class velm_simulation final : public velm_system_calls {
     std::optional<std::string> read(const std::string& path, size_t limit);
     // The names in the directory at path, as a listing shows them now;
     // none when it is no directory or cannot be listed.
-    std::optional<std::vector<std::string>> names(const std::string& path);
+    std::optional<velm_names> names(const std::string& path);
     // Puts made at the canonical path, as a change of the tree's.
     void put(const std::string& canonical, const velm_entry& made);
     // Makes path a copy of the directory below outside, which lies outside
@@ -64,15 +64,18 @@ class velm_simulation final : public velm_system_calls {
     // Whether the boot may add or remove entries in a directory: 0, or the
     // error the kernel gives it.
     int may_change_in(const std::string& directory);
-    // Forgets every simulated change.
-    void reset();
     // The simulated changes so far, to come back to.
     using changes = std::map<std::string, velm_entry>;
     changes checkpoint();
     void rewind(const changes& to);
     // Where path leads inside the root, its last component not followed
     // (or followed).
-    std::string where(const std::string& path, bool follow = false);
+    std::string where(const std::string& path, bool follow = false)
+    {
+        std::string canonical;
+        look(path, follow, &canonical);
+        return canonical;
+    }
     // Whether the file at path was written since the writes were forgotten
     // (as a run of the boot begins).
     bool written(const std::string& path);
@@ -91,15 +94,11 @@ class velm_simulation final : public velm_system_calls {
 
   private:
     velm_entry real_entry(int base, const std::string& real);
-    velm_entry look_up(int base, const std::string& real);
     velm_entry entry_at(const std::string& canonical);
     velm_entry resolve(const std::string& path, bool follow, std::string& canonical);
-    int may_write(const velm_entry& entry, int mode);
-    bool unremovable(const velm_entry& entry);
+    int may_write(const velm_entry& entry);
     int may_remove(const char* path, std::string& canonical, velm_entry& entry);
-    int rmdir(const char* path);
     int unlink_entry(const char* path);
-    bool empty_directory(const std::string& canonical);
     int open_for_writing(const std::string& canonical, const velm_entry& entry);
     int open_for_reading(const std::string& canonical, const velm_entry& entry, int flags);
     void settle();

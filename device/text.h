@@ -1,23 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// Texts as every program shows them. A link target, a file's word or a
-// name may hold any bytes: in text, control characters and what is not
-// valid UTF-8 are escaped as \xHH, so that nothing reaches a terminal as a
-// command or reorders a line; in JSON, as JSON escapes and \udcHH.
+// A run of the boot as both programs show it.
 #ifndef TZLINKS_DEVICE_TEXT_H
 #define TZLINKS_DEVICE_TEXT_H
 
 #include "device/boot.h"
+#include "support/text.h"
 
 #include <string>
 
-// Texts longer than this are shown cut, the cut marked.
-const size_t longest_text = 8192;
-
-// A text as the text report shows it: cut, escaped.
-std::string shown(const std::string& text);
-// A JSON string: cut, escaped; whole when it has to stay whole (a command).
-std::string json_text(const std::string& text, bool whole = false);
-std::string json_text(const velm_text& text); // null when none
 // "  name -> target" or "  name: no link", and a line end.
 std::string text_link(const char* name, const velm_text& target);
 // A run of the boot, as text (a line for each thing it does) and as JSON.

@@ -307,50 +307,41 @@ find_live(finder& f)
         .tries = {{}, {rm(velm_path::latest_link)}};
 }
 
-// Why the update tz_latest names is not adopted, or not for good.
+// A tz_latest the boot tool does not understand: why, and what it does.
 void
-find_latest(finder& f)
+latest_not_understood(finder& f, const velm_entry& entry)
+{
+    velm_simulation& tree = f.now();
+    std::string target = f.r.tz_latest.value_or("");
+    std::string why =
+        entry.kind != velm_entry::link ? "is no link"
+        : !has_prefix(target, "/") ? "names \"" + target + "\": a relative target is never understood"
+        : !has_prefix(target, velm_path::updates) || velm_update_of(target).empty()
+            ? "names \"" + target + "\", which is no update below " + velm_path::updates
+            : "names " + target + ", whose version holds a number too large";
+    velm_finding& found =
+        f.add("warning", "latest-not-understood", velm_path::latest_link,
+              std::string(velm_path::latest_link) + " " + why + ": the next boot " +
+                  (f.r.next_boot.abandoned ? "gives up its choice and links the system data"
+                                           : what_it_does(f.r.next_boot)) +
+                  ".");
+    std::string meant = tree.where(std::string(velm_path::link_directory) + "/" + target);
+    if (entry.kind == velm_entry::link && !has_prefix(target, "/") &&
+        velm_update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
+        found.tries.push_back({ln(meant, velm_path::latest_link)});
+    found.tries.push_back({rm(velm_path::latest_link)});
+}
+
+// An update refused by the next boot, or adopted and set aside by the one
+// after: why, in the boot's terms or the tree's.
+void
+latest_refused(finder& f, const velm_refusal& refusal)
 {
     const velm_report& r = f.r;
-    velm_simulation& tree = f.now();
-    velm_entry entry = tree.look(velm_path::latest_link);
-    if (entry.kind == velm_entry::absent)
-        return;
-    const velm_run& next = r.next_boot;
     const velm_dataset_facts& latest = r.latest;
-    std::string target = r.tz_latest.value_or("");
+    velm_simulation& tree = f.now();
+    std::string target = r.tz_latest.value_or(""), name = "tz_latest names " + latest.version;
     velm_commands unlink = {rm(velm_path::latest_link)};
-    if (!latest.present) {
-        std::string why =
-            entry.kind != velm_entry::link ? "is no link"
-            : !has_prefix(target, "/")
-                ? "names \"" + target + "\": a relative target is never understood"
-            : !has_prefix(target, velm_path::updates) || velm_update_of(target).empty()
-                ? "names \"" + target + "\", which is no update below " + velm_path::updates
-                : "names " + target + ", whose version holds a number too large";
-        velm_finding& found =
-            f.add("warning", "latest-not-understood", velm_path::latest_link,
-                  std::string(velm_path::latest_link) + " " + why + ": the next boot " +
-                      (next.abandoned ? "gives up its choice and links the system data"
-                                      : what_it_does(next)) +
-                      ".");
-        std::string meant = tree.where(std::string(velm_path::link_directory) + "/" + target);
-        if (entry.kind == velm_entry::link && !has_prefix(target, "/") &&
-            velm_update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
-            found.tries.push_back({ln(meant, velm_path::latest_link)});
-        found.tries.push_back(unlink);
-        return;
-    }
-    if (r.live.present && latest.root == r.live.root && next.action == "keep") {
-        f.add("note", "latest-in-use", latest.root,
-              "tz_latest names the data in use, " + latest.version + "; every boot says so.");
-        return;
-    }
-    // Refused by the next boot, or adopted and set aside by the one after.
-    auto refusal = refusal_of(next, r.after_next ? &*r.after_next : nullptr);
-    if (!refusal)
-        return;
-    std::string name = "tz_latest names " + latest.version;
     velm_commands to_live = r.live.present && !r.live.root.empty()
                                 ? velm_commands{ln(r.live.root, velm_path::latest_link)}
                                 : unlink;
@@ -378,11 +369,11 @@ find_latest(finder& f)
                             ln(renamed, velm_path::latest_link)}};
     } else {
         velm_finding& found =
-            f.add("warning", refusal->id.c_str(), latest.root,
-                  name + ", " + refusal->reason +
-                      (!next.adopted ? ": no boot adopts it."
-                                     : ": the next boot adopts it, the data in use being older "
-                                       "still, and the boot after sets it aside."));
+            f.add("warning", refusal.id.c_str(), latest.root,
+                  name + ", " + refusal.reason +
+                      (!r.next_boot.adopted ? ": no boot adopts it."
+                                            : ": the next boot adopts it, the data in use being "
+                                              "older still, and the boot after sets it aside."));
         std::string want = r.system.icu_schema;
         if (!latest.compatible)
             found.manual = want.empty() ? "the system's ICU schema, such as 44l, as the first word "
@@ -391,11 +382,29 @@ find_latest(finder& f)
                                         : "ICU data built for schema " + want + ", as " +
                                               latest.root + "/icutz/icutz" + want +
                                               ".dat, a regular file readable by others";
-        else if (latest.older)
-            found.tries = {unlink};
         else
-            found.tries = {to_live, unlink};
+            found.tries = latest.older ? std::vector<velm_commands>{unlink}
+                                       : std::vector<velm_commands>{to_live, unlink};
     }
+}
+
+// Why the update tz_latest names is not adopted, or not for good.
+void
+find_latest(finder& f)
+{
+    const velm_report& r = f.r;
+    velm_entry entry = f.now().look(velm_path::latest_link);
+    if (entry.kind == velm_entry::absent)
+        return;
+    if (!r.latest.present)
+        return latest_not_understood(f, entry);
+    if (r.live.present && r.latest.root == r.live.root && r.next_boot.action == "keep") {
+        f.add("note", "latest-in-use", r.latest.root,
+              "tz_latest names the data in use, " + r.latest.version + "; every boot says so.");
+        return;
+    }
+    if (auto refusal = refusal_of(r.next_boot, r.after_next ? &*r.after_next : nullptr))
+        latest_refused(f, *refusal);
 }
 
 // The updates unpacked below tz/: those no link names, and what is wrong

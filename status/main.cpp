@@ -72,7 +72,7 @@ main(int argc, char** argv)
         status != 0)
         return status;
     velm_simulation tree(device.fd);
-    velm_report report = make_report(tree, device.root);
+    velm_report report = make_report(tree, device);
     // Scripts and metrics are written whatever the health: it is inside them.
     if (form == "metrics" && !given["metrics"].empty())
         return write_metrics(given["metrics"], metrics_report(report)) ? 0 : EX_IOERR;

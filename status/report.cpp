@@ -220,33 +220,20 @@ check_repairs(velm_simulation& tree, velm_report& r)
         r.repaired_findings.push_back(finding.id);
 }
 
-// A path a command names, as it lies inside the tree: below DIR, the shell
-// would follow an absolute link on the way out of DIR, where the boot, and
-// this report, read the tree inside it.
-static std::string
-inside(velm_simulation& tree, const std::string& path)
-{
-    size_t slash = path.rfind('/');
-    if (slash == 0 || slash == std::string::npos ||
-        tree.look(path.substr(0, slash), true).kind != velm_entry::directory)
-        return path;
-    return tree.where(path.substr(0, slash), true) + path.substr(slash);
-}
-
 velm_report
-make_report(velm_simulation& tree, const std::string& root)
+make_report(velm_simulation& tree, const velm_device& device)
 {
-    velm_report r = survey(tree, root);
+    velm_report r = survey(tree, device.root);
     check_repairs(tree, r);
     // cppcheck-suppress constVariable ; its commands are rewritten
     for (velm_finding& finding : r.findings) {
-        if (root.empty() || !finding.commands)
+        if (!finding.commands)
             continue;
         for (velm_command& c : *finding.commands) {
             if (c.verb != velm_command::symlink_to && c.verb != velm_command::write_word)
-                c.first = inside(tree, c.first);
+                c.first = device.real(c.first);
             if (!c.second.empty())
-                c.second = inside(tree, c.second);
+                c.second = device.real(c.second);
         }
     }
     return r;

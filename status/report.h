@@ -6,6 +6,7 @@
 #define TZLINKS_STATUS_REPORT_H
 
 #include "device/boot.h"
+#include "device/device.h"
 #include "device/simulation.h"
 #include "device/text.h"
 #include "status/commands.h"
@@ -48,7 +49,7 @@ struct velm_report {
 
 // The report of the tree as the simulation shows it now; the simulation is
 // left as it was found. root is how commands name the tree.
-velm_report make_report(velm_simulation& tree, const std::string& root);
+velm_report make_report(velm_simulation& tree, const velm_device& device);
 
 // The findings of a report, for a report of a tree changed in the simulation.
 void find_problems(velm_simulation& tree, velm_report& r);

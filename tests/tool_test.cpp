@@ -163,6 +163,8 @@ TEST(status, command_line)
          "tzlinks-status: /proc/self holds no device tree: it lacks var/ or usr/share/\n"},
         {"--version", 0, "tzlinks-status " TZLINKS_VERSION "\n", ""},
         {"-x", 64, "", "tzlinks-status: unknown argument: -x\n" + usage},
+        {"--metricsfoo", 64, "", "tzlinks-status: unknown argument: --metricsfoo\n" + usage},
+        {"--metrics=", 64, "", "tzlinks-status: missing value after: --metrics=\n" + usage},
         {"--json --root", 64, "", "tzlinks-status: missing directory after: --root\n" + usage},
         {"--root=/no", 66, "", "tzlinks-status: cannot read /no: No such file or directory\n"},
         {"--root /dev/null", 66, "", "tzlinks-status: cannot read /dev/null: Not a directory\n"},

@@ -212,6 +212,33 @@ TEST(update, command_line)
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
 }
 
+// An image whose /var/db/timezone is an absolute link, as where /var is
+// small: every program follows it inside the image, never to the host's
+// path of that name (here the sandbox's /var/lib/timezone, a decoy that
+// must stay as it is), and names the image's own paths; the report then
+// foretells the boot that check foretold.
+TEST(update, image_with_absolute_link)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("TREE=/dev/shm/image; system_dataset 2023c 44l; live_system; "
+                           "update_dataset 2023d 44l; mkdir -p $TREE/var/lib; mv $TREE$tz "
+                           "$TREE/var/lib/timezone; ln -s /var/lib/timezone $TREE$tz; TREE=; "
+                           "update_dataset 2023d 44l; mkdir -p /var/lib; mv $tz /var/lib/timezone; "
+                           "update_source /var/tmp/src 2025b 44l"));
+    std::string decoy = run("find /var/lib/timezone -printf '%p %C@\\n'").out,
+                image = " --root /dev/shm/image", real = "/dev/shm/image/var/lib/timezone";
+    json judged = json::parse(run(update("check /var/tmp/src --json" + image)).out);
+    EXPECT_EQ(judged["verdict"], 0);
+    outcome staged = run(update("stage /var/tmp/src" + image));
+    EXPECT_EQ(staged.out.substr(0, staged.out.find('\n')),
+              "Staged " + real + "/tz/2025b.1.0 as 2025b.1.0");
+    EXPECT_EQ(json::parse(run(program(TZLINKS_STATUS_BINARY, "--json" + image)).out)["next_boot"],
+              judged["next_boot"]);
+    EXPECT_EQ(run(update("prune" + image)).out, "Removed " + real + "/tz/2023d\n");
+    EXPECT_EQ(run("ls -A " + real + "/tz " + real + "/.tzlinks-update.lock").status, 0);
+    EXPECT_EQ(run("find /var/lib/timezone -printf '%p %C@\\n'").out, decoy);
+}
+
 INSTANTIATE_TEST_SUITE_P(tzlinks_update, update_tool, ::testing::ValuesIn(load_rows("update.rows")),
                          [](const auto& each) { return each.param.name; });
 

@@ -35,7 +35,7 @@ open_lock(int links)
 int
 take_lock(const velm_device& device, int links, int seconds, bool clear)
 {
-    std::string path = shown(device.named(velm_path::link_directory) + "/" + lock_name);
+    std::string path = shown(device.named(velm_path::link_directory + std::string("/") + lock_name));
     int fd = open_lock(links);
     if (fd < 0 && clear && (errno == ELOOP || errno == EEXIST || errno == EISDIR)) {
         if (int error = remove_all(links, lock_name); error != 0)

@@ -130,7 +130,7 @@ run(const std::string& command, const std::string& source,
         return check(device, src, source, version, given.count("json") != 0);
     int links = device.open_directory(velm_path::link_directory);
     if (links < 0) {
-        warn("cannot open %s", shown(device.named(velm_path::link_directory)).c_str());
+        warn("cannot open %s", shown(device.root + velm_path::link_directory).c_str());
         return EX_IOERR;
     }
     auto wait = given.find("wait");

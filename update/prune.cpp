@@ -96,8 +96,8 @@ prune(const velm_device& device, int links, bool dry_run)
     struct stat st;
     if (fstatat(links, ".tz_latest.new", &st, AT_SYMLINK_NOFOLLOW) == 0)
         status = std::max(status, remove_named(links, ".tz_latest.new",
-                                               device.named(velm_path::link_directory) +
-                                                   "/.tz_latest.new",
+                                               device.named(velm_path::link_directory +
+                                                            std::string("/.tz_latest.new")),
                                                dry_run));
     return status;
 }
