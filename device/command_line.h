@@ -9,6 +9,23 @@
 #include <map>
 #include <string>
 
+// A long option: without a value, with one, or with one that may be left out.
+constexpr option
+flag(const char* name)
+{
+    return {name, no_argument, nullptr, 0};
+}
+constexpr option
+valued(const char* name)
+{
+    return {name, required_argument, nullptr, 0};
+}
+constexpr option
+maybe_valued(const char* name)
+{
+    return {name, optional_argument, nullptr, 0};
+}
+
 // Says what is wrong with the word and how the program is used: EX_USAGE.
 int usage_error(const char* usage, const char* why, const std::string& word);
 // status, once what was written to standard output has got there; else

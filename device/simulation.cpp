@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <dirent.h>
 #include <fcntl.h>
 #include <linux/fs.h>
 #include <sys/ioctl.h>
@@ -202,20 +201,11 @@ list(const velm_entry& directory, std::set<std::string>& found)
 {
     int fd = openat(directory.base, relative(directory.real).c_str(),
                     O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    DIR* listing = fd < 0 ? nullptr : fdopendir(fd);
-    if (listing == nullptr) {
-        int error = errno;
-        if (fd >= 0)
-            (void)close(fd);
-        return error;
-    }
-    errno = 0;
-    // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* child = readdir(listing))
-        found.insert(child->d_name);
-    int error = errno;
-    closedir(listing);
-    found.erase("."), found.erase("..");
+    velm_names names;
+    int error = fd < 0 ? errno : velm_fs::names_in(fd, names);
+    if (fd >= 0)
+        (void)close(fd);
+    found.insert(names.begin(), names.end());
     return error;
 }
 

@@ -10,6 +10,9 @@
 #include <cstring>
 #include <sysexits.h>
 
+static const option options[] = {flag("json"),  flag("commands"), maybe_valued("metrics"),
+                                  valued("root"), flag("help"),     flag("version"),
+                                  {}};
 static const char usage[] =
     "usage: tzlinks-status [--json | --commands | --metrics[=DIR]] [--root DIR]\n"
     "       tzlinks-status --help | --version\n";
@@ -23,11 +26,6 @@ static const char help[] =
     "Exit status: 0 healthy, 1 degraded, 2 broken, 64 usage, 66 DIR unreadable or\n"
     "no device tree, 74 the report could not be written. See tzlinks-status(8).\n";
 
-static const option options[] = {
-    {"json", no_argument, nullptr, 0},    {"commands", no_argument, nullptr, 0},
-    {"metrics", optional_argument, nullptr, 0}, {"root", required_argument, nullptr, 0},
-    {"help", no_argument, nullptr, 0},    {"version", no_argument, nullptr, 0},
-    {nullptr, 0, nullptr, 0}};
 static const char* const forms[] = {"json", "commands", "metrics"};
 
 // The form asked for, text when none: at most one.

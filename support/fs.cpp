@@ -3,6 +3,8 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstring>
+#include <dirent.h>
 #include <err.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -117,6 +119,28 @@ read_link_at(int dir, const std::string& name, std::string& target)
             return 0;
         }
     }
+}
+
+int
+names_in(int dir, std::vector<std::string>& names)
+{
+    int listing = openat(dir, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    DIR* entries = listing < 0 ? nullptr : fdopendir(listing);
+    if (entries == nullptr) {
+        int error = errno;
+        if (listing >= 0)
+            (void)close(listing);
+        return error;
+    }
+    errno = 0;
+    // cppcheck-suppress readdirCalled ; one thread, one directory stream
+    while (const struct dirent* entry = readdir(entries)) {
+        if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0)
+            names.emplace_back(entry->d_name);
+    }
+    int error = errno;
+    closedir(entries);
+    return error;
 }
 
 void

@@ -11,6 +11,7 @@
 
 #include <string>
 #include <sys/types.h>
+#include <vector>
 
 // Every call the boot tool makes on a path goes through this seam, each as
 // the system call or C library function it stands for: -1 and errno on
@@ -76,6 +77,10 @@ void create_symlink(const std::string& target, const std::string& link_path);
 // (readlinkat(2), read again into a larger buffer until it fits): 0, or the
 // errno of the failed call. Never warns.
 int read_link_at(int dir, const std::string& name, std::string& target);
+
+// The names in the directory dir, but for "." and "..": 0, or the errno of
+// the listing that failed (names then holds what was read). Never warns.
+int names_in(int dir, std::vector<std::string>& names);
 
 // Replaces the content of the regular file at path, created when missing,
 // and leaves anything else there alone: a link (not followed), a FIFO, a

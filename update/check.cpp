@@ -13,7 +13,10 @@
 #include "support/version.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstring>
+#include <err.h>
+#include <sysexits.h>
 
 namespace {
 
@@ -173,6 +176,21 @@ judge(const velm_device& device, int fd, const velm_source& walked_, const std::
     bool warned = !j.next_boot.messages.empty() || (j.after && !j.after->kept);
     j.verdict = !j.problems.empty() ? refused : warned ? adopted_with_warnings : adopted_clean;
     return j;
+}
+
+int
+copy_and_judge(const velm_device& device, int src, int copy, const std::string& name,
+               const std::string& version, const char* consequence, velm_judgement& j)
+{
+    velm_source walked;
+    if (!walk_source(src, copy, name, walked))
+        return EX_IOERR;
+    j = judge(device, copy, walked, name, version);
+    if (j.error == 0)
+        return 0;
+    errno = j.error;
+    warn("cannot read %s%s", shown(device.named(j.unread)).c_str(), consequence);
+    return EX_IOERR;
 }
 
 bool

@@ -38,12 +38,9 @@ static const char help[] =
     "Exit status: 0 adopted, 1 adopted with warnings, 2 refused, 64 usage, 66 SRC or\n"
     "DIR unreadable, 74 a change failed, 75 locked. See tzlinks-update(8).\n";
 
-static const option options[] = {
-    {"as", required_argument, nullptr, 0},   {"json", no_argument, nullptr, 0},
-    {"force", no_argument, nullptr, 0},      {"wait", required_argument, nullptr, 0},
-    {"root", required_argument, nullptr, 0}, {"dry-run", no_argument, nullptr, 0},
-    {"help", no_argument, nullptr, 0},       {"version", no_argument, nullptr, 0},
-    {nullptr, 0, nullptr, 0}};
+static const option options[] = {valued("as"),   flag("json"),    flag("force"),
+                                  valued("wait"), valued("root"),  flag("dry-run"),
+                                  flag("help"),   flag("version"), {}};
 // The commands, and the options each takes.
 static const std::pair<const char*, std::set<std::string>> commands[] = {
     {"check", {"as", "json", "root"}},
@@ -94,15 +91,9 @@ check(const velm_device& device, int src, const std::string& name, const std::st
     }
     (void)atexit(remove_scratch);
     int copy = open(scratch.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    velm_source walked;
-    if (copy < 0 || !walk_source(src, copy, name, walked))
+    velm_judgement j;
+    if (copy < 0 || copy_and_judge(device, src, copy, name, version, "", j) != 0)
         return EX_IOERR;
-    velm_judgement j = judge(device, copy, walked, name, version);
-    if (j.error != 0) {
-        errno = j.error;
-        warn("cannot read %s", shown(device.named(j.unread)).c_str());
-        return EX_IOERR;
-    }
     (void)fputs((as_json ? judgement_json(j, name) : judgement_text(j, name)).c_str(), stdout);
     return written(j.verdict);
 }

@@ -6,6 +6,8 @@
 #include "update/tree.h"
 #include "update/update.h"
 
+#include "support/fs.h"
+
 #include "device/data.h"
 #include "device/text.h"
 #include "support/paths.h"
@@ -70,7 +72,7 @@ prune(const velm_device& device, int links, bool dry_run)
     std::string top = device.named(velm_path::updates);
     int updates = device.open_directory(velm_path::updates);
     std::vector<std::string> names;
-    int error = updates < 0 ? errno : names_in(updates, names);
+    int error = updates < 0 ? errno : velm_fs::names_in(updates, names);
     if (error != 0 && !(updates < 0 && error == ENOENT)) {
         errno = error;
         warn("cannot read %s; nothing was removed", shown(top).c_str());

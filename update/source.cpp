@@ -142,7 +142,7 @@ bool
 walker::walk(int from, int to, const std::string& at, int depth)
 {
     std::vector<std::string> names;
-    if (int error = names_in(from, names); error != 0)
+    if (int error = velm_fs::names_in(from, names); error != 0)
         unsafe(at, std::string("cannot be listed: ") + strerror(error));
     for (const std::string& child : names) {
         if (!entry(from, to, at, child, depth))

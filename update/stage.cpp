@@ -51,7 +51,7 @@ static int
 clear_leftovers(const velm_device& device, int links, int updates)
 {
     std::vector<std::string> names;
-    int error = names_in(updates, names);
+    int error = velm_fs::names_in(updates, names);
     for (const std::string& name : names) {
         if (error == 0 && has_prefix(name, ".stage-"))
             error = remove_all(updates, name);
@@ -145,15 +145,9 @@ copy_judge_place(const velm_device& device, int links, int updates, int src,
                  const std::string& name, const std::string& version, bool force,
                  const std::string& staging, int copy)
 {
-    velm_source walked;
-    if (!walk_source(src, copy, name, walked))
+    velm_judgement j;
+    if (copy_and_judge(device, src, copy, name, version, "; nothing was staged", j) != 0)
         return EX_IOERR;
-    velm_judgement j = judge(device, copy, walked, name, version);
-    if (j.error != 0) {
-        errno = j.error;
-        warn("cannot read %s; nothing was staged", shown(device.named(j.unread)).c_str());
-        return EX_IOERR;
-    }
     if (unusable(j) || (j.verdict == refused && !force)) {
         (void)fputs(judgement_text(j, name).c_str(), stdout);
         warnx("%s is refused; nothing was staged", shown(name).c_str());

@@ -13,28 +13,6 @@
 
 static const int directory_flags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 
-int
-names_in(int dir, std::vector<std::string>& names)
-{
-    int listing = openat(dir, ".", directory_flags);
-    DIR* entries = listing < 0 ? nullptr : fdopendir(listing);
-    if (entries == nullptr) {
-        int error = errno;
-        if (listing >= 0)
-            (void)close(listing);
-        return error;
-    }
-    errno = 0;
-    // cppcheck-suppress readdirCalled ; one thread, one directory stream
-    while (const struct dirent* entry = readdir(entries)) {
-        if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0)
-            names.emplace_back(entry->d_name);
-    }
-    int error = errno;
-    closedir(entries);
-    return error;
-}
-
 // Whether two open files hold the same bytes: 1, 0, or -1.
 static int
 same_file(int a, int b)
@@ -83,7 +61,7 @@ int
 same_content(int a, int b)
 {
     std::vector<std::string> names, others;
-    if (names_in(a, names) != 0 || names_in(b, others) != 0)
+    if (velm_fs::names_in(a, names) != 0 || velm_fs::names_in(b, others) != 0)
         return -1;
     if (std::set<std::string>(names.begin(), names.end()) !=
         std::set<std::string>(others.begin(), others.end()))
@@ -101,7 +79,7 @@ static int
 clear_files(int fd, dev_t device, std::vector<std::string>& below, std::string& failed)
 {
     std::vector<std::string> names;
-    int error = names_in(fd, names);
+    int error = velm_fs::names_in(fd, names);
     for (const std::string& name : names) {
         struct stat st;
         int now = 0;

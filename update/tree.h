@@ -7,9 +7,6 @@
 #include <string>
 #include <vector>
 
-// The names in a directory, but for "." and "..": 0, or the errno of the
-// listing that failed (names then holds what was read).
-int names_in(int dir, std::vector<std::string>& names);
 // Whether two trees hold the same names, kinds, modes, bytes and link
 // targets: 1 the same, 0 not, -1 when one could not be read (errno).
 int same_content(int a, int b);

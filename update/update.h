@@ -59,6 +59,10 @@ struct velm_judgement {
 // Judges the update below fd (SRC, or its staged copy) as version.
 velm_judgement judge(const velm_device& device, int fd, const velm_source& walked,
                      const std::string& name, const std::string& version);
+// Copies src into the empty directory copy and judges the copy: 0, or
+// EX_IOERR, said with the consequence, when the copy or a read failed.
+int copy_and_judge(const velm_device& device, int src, int copy, const std::string& name,
+                   const std::string& version, const char* consequence, velm_judgement& j);
 bool unusable(const velm_judgement& j);
 std::string judgement_text(const velm_judgement& j, const std::string& name);
 std::string judgement_json(const velm_judgement& j, const std::string& name);
