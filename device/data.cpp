@@ -6,6 +6,8 @@
 #include "support/paths.h"
 #include "support/prefix.h"
 
+#include <cerrno>
+
 std::string
 velm_update_of(const std::string& path)
 {
@@ -13,6 +15,25 @@ velm_update_of(const std::string& path)
     if (path.size() <= prefix || !has_prefix(path, velm_path::updates) || path[prefix] == '/')
         return "";
     return path.substr(0, path.find('/', prefix));
+}
+
+std::set<std::string>
+velm_named_updates(velm_simulation& tree, std::string* unread)
+{
+    std::set<std::string> named;
+    for (const char* link :
+         {velm_path::zoneinfo_link, velm_path::icutz_link, velm_path::latest_link}) {
+        velm_entry entry = tree.look(link);
+        named.insert(velm_update_of(entry.kind == velm_entry::link ? entry.text : ""));
+        named.insert(velm_update_of(tree.where(link, true)));
+    }
+    named.erase("");
+    // A loop of links names nothing; any other failure could hide a name.
+    for (const auto& [path, error] : tree.unread()) {
+        if (unread != nullptr && error != ELOOP && error != ENAMETOOLONG && error != EFBIG)
+            *unread = path;
+    }
+    return named;
 }
 
 std::string

@@ -8,11 +8,16 @@
 
 #include "device/simulation.h"
 
+#include <set>
 #include <string>
 
 // The update a path lies in, /var/db/timezone/tz/NAME; "" for a path in
 // none.
 std::string velm_update_of(const std::string& path);
+// The updates the links zoneinfo, icutz and tz_latest name, read as the
+// boot reads them or followed inside the tree. A read that fails is named
+// in unread, if given: what it hides could be a name.
+std::set<std::string> velm_named_updates(velm_simulation& tree, std::string* unread = nullptr);
 // The first word of a file, as the boot reads +VERSION.
 std::string velm_first_word(velm_simulation& tree, const std::string& path);
 // The ICU data file the boot takes in an update's icutz directory, as a

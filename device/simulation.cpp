@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <dirent.h>
 #include <fcntl.h>
 #include <linux/fs.h>
 #include <sys/ioctl.h>
@@ -194,18 +195,30 @@ velm_simulation::read(const std::string& path, size_t limit)
     return text;
 }
 
-// The names below a real directory: 0, or the errno of a listing that
-// could not be made whole.
+// The names below a real directory and their kinds, as its listing tells
+// them: 0, or the errno of a listing that could not be made whole.
 static int
-list(const velm_entry& directory, std::set<std::string>& found)
+list(const velm_entry& directory, velm_names& found)
 {
     int fd = openat(directory.base, relative(directory.real).c_str(),
                     O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    velm_names names;
-    int error = fd < 0 ? errno : velm_fs::names_in(fd, names);
+    std::vector<std::string> names;
+    std::vector<unsigned char> types;
+    int error = fd < 0 ? errno : velm_fs::names_in(fd, names, &types);
+    for (size_t i = 0; i < names.size(); ++i) {
+        struct stat st = {};
+        unsigned char type = types[i];
+        if (type == DT_UNKNOWN && fstatat(fd, names[i].c_str(), &st, AT_SYMLINK_NOFOLLOW) == 0)
+            type = IFTODT(st.st_mode);
+        found[names[i]] = type == DT_LNK    ? velm_entry::link
+                          : type == DT_REG  ? velm_entry::file
+                          : type == DT_DIR  ? velm_entry::directory
+                          : type == DT_FIFO ? velm_entry::fifo
+                          : type == DT_SOCK ? velm_entry::socket
+                                            : velm_entry::device;
+    }
     if (fd >= 0)
         (void)close(fd);
-    found.insert(names.begin(), names.end());
     return error;
 }
 
@@ -215,8 +228,15 @@ velm_simulation::names(const std::string& path)
     int saved = errno;
     std::string canonical;
     velm_entry entry = resolve(path, true, canonical);
-    std::set<std::string> found;
-    int error = entry.kind != velm_entry::directory ? -1 : entry.fresh ? 0 : list(entry, found);
+    auto known = listed.find({entry.base, entry.real});
+    if (entry.kind == velm_entry::directory && !entry.fresh && known == listed.end()) {
+        velm_names real;
+        int error = list(entry, real);
+        known = listed.emplace(std::make_pair(entry.base, entry.real), std::make_pair(error, real))
+                    .first;
+    }
+    int error = entry.kind != velm_entry::directory ? -1 : entry.fresh ? 0 : known->second.first;
+    velm_names found = error == 0 && !entry.fresh ? known->second.second : velm_names();
     if (error > 0)
         trouble.emplace(canonical, error);
     // What the simulation changed right below it.
@@ -228,10 +248,10 @@ velm_simulation::names(const std::string& path)
         if (name.find('/') == std::string::npos && c->second.kind == velm_entry::absent)
             found.erase(name);
         else if (name.find('/') == std::string::npos)
-            found.insert(name);
+            found[name] = c->second.kind;
     }
     errno = saved;
-    return error != 0 ? std::nullopt : std::optional<velm_names>(velm_names(found.begin(), found.end()));
+    return error != 0 ? std::nullopt : std::optional<velm_names>(found);
 }
 
 void
@@ -454,8 +474,8 @@ velm_simulation::remove(const char* path)
     velm_entry entry;
     if (int error = may_remove(path, canonical, entry); error != 0)
         return fail(error);
-    auto listed = names(canonical);
-    if (!listed || !listed->empty())
+    auto inside = names(canonical);
+    if (!inside || !inside->empty())
         return fail(ENOTEMPTY);
     changed[canonical] = velm_entry();
     errno = saved;

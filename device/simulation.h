@@ -29,7 +29,8 @@ struct velm_entry {
     std::string real;    // ... at this path ("" for base itself, else "/a/b")
 };
 
-using velm_names = std::vector<std::string>;
+// The names in a directory, each with what stands there.
+using velm_names = std::map<std::string, velm_entry::kind_t>;
 
 class velm_simulation final : public velm_system_calls {
   public:
@@ -50,11 +51,14 @@ class velm_simulation final : public velm_system_calls {
     // with where it leads inside the root, when canonical is given.
     velm_entry look(const std::string& path, bool follow = false,
                     std::string* canonical = nullptr);
+    // The entry at a canonical path (as look gives it), nothing followed:
+    // for the names of a directory already resolved, the quickest look.
+    velm_entry at(const std::string& canonical) { return entry_at(canonical); }
     // Up to limit bytes of the file at path, following links; none when it
     // is no regular file or cannot be read. A cut shows as limit bytes.
     std::optional<std::string> read(const std::string& path, size_t limit);
-    // The names in the directory at path, as a listing shows them now;
-    // none when it is no directory or cannot be listed.
+    // The names in the directory at path, as a listing shows them now,
+    // with their kinds; none when it is no directory or cannot be listed.
     std::optional<velm_names> names(const std::string& path);
     // Puts made at the canonical path, as a change of the tree's.
     void put(const std::string& canonical, const velm_entry& made);
@@ -111,6 +115,7 @@ class velm_simulation final : public velm_system_calls {
     std::vector<std::pair<int, std::string>> pending; // files open for writing
     std::map<std::string, int> trouble;
     std::map<std::pair<int, std::string>, velm_entry> looked; // real entries, as looked up
+    std::map<std::pair<int, std::string>, std::pair<int, velm_names>> listed; // and listings
 };
 
 #endif

@@ -1,6 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "status/commands.h"
 
+#include "device/data.h"
+#include "support/paths.h"
+#include "support/prefix.h"
+
 #include <algorithm>
 #include <cerrno>
 
@@ -36,6 +40,34 @@ make_dirs(velm_simulation& tree, const std::string& path)
     return true;
 }
 
+// tzlinks-update prune: the directories below tz/ that no link names or
+// that a cut stage left, its new link, and a lock entry that wedges.
+static bool
+prune(velm_simulation& tree)
+{
+    std::set<std::string> named = velm_named_updates(tree);
+    std::string links = tree.where(velm_path::link_directory, true),
+                updates = tree.where(velm_path::updates, true);
+    std::vector<std::string> gone;
+    if (tree.at(links + "/.tz_latest.new").kind != velm_entry::absent)
+        gone.push_back(links + "/.tz_latest.new");
+    velm_entry lock = tree.at(links + "/.tzlinks-update.lock");
+    if (lock.kind != velm_entry::absent && lock.kind != velm_entry::file)
+        gone.push_back(links + "/.tzlinks-update.lock");
+    for (const auto& [name, kind] : tree.names(updates).value_or(velm_names())) {
+        if (kind == velm_entry::directory &&
+            (has_prefix(name, ".stage-") || named.count(velm_path::updates + name) == 0))
+            gone.push_back(updates + "/" + name);
+    }
+    std::set<std::string> checked; // the kernel is asked once about each directory
+    for (const std::string& canonical : gone) {
+        if (checked.insert(parent_of(canonical)).second && refused(tree, parent_of(canonical)))
+            return false;
+        tree.put(canonical, velm_entry());
+    }
+    return true;
+}
+
 bool
 apply(velm_simulation& tree, const velm_command& command)
 {
@@ -46,6 +78,8 @@ apply(velm_simulation& tree, const velm_command& command)
                   verb == velm_command::copy_tree || verb == velm_command::move_tree, &canonical);
     if (verb == velm_command::make_dirs)
         return make_dirs(tree, command.first);
+    if (verb == velm_command::prune)
+        return prune(tree);
     bool changes_first = verb != velm_command::copy_tree && verb != velm_command::write_word;
     if (entry.error != 0 || (changes_first && refused(tree, parent_of(canonical))))
         return false;
@@ -109,6 +143,8 @@ shell_text(const velm_command& c, const std::string& root)
         return "test -e " + second + " || mv " + first + " " + second;
     case velm_command::write_word:
         return "printf '%s\\n' " + quote(c.first) + " >" + second;
+    case velm_command::prune:
+        return "tzlinks-update prune" + (root.empty() ? "" : " --root " + quote(root));
     }
     return "";
 }

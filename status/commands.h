@@ -19,6 +19,7 @@ struct velm_command {
         copy_tree,    // cp -a FIRST SECOND (a directory), unless SECOND exists
         move_tree,    // mv FIRST SECOND, unless SECOND exists
         write_word,   // printf '%s\n' FIRST >SECOND
+        prune,        // tzlinks-update prune: what no link names, and a cut stage's leftovers
     } verb;
     std::string first, second;
 };

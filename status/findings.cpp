@@ -11,6 +11,7 @@
 #include "support/version.h"
 
 #include <algorithm>
+#include <set>
 #include <cstring>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -109,6 +110,7 @@ what_it_does(const velm_run& run)
 struct finder {
     velm_simulation& tree;
     velm_report& r;
+    const velm_simulation::changes* at = nullptr; // where the simulation stands
 
     velm_finding& add(const char* severity, const char* id, const std::string& subject,
                       const std::string& message)
@@ -119,14 +121,13 @@ struct finder {
         r.findings.push_back(finding);
         return r.findings.back();
     }
-    velm_simulation& now()
+    // A rewind copies every change: made only when the other state is asked.
+    velm_simulation& now() { return state(r.now); }
+    velm_simulation& next() { return state(r.next); }
+    velm_simulation& state(const velm_simulation::changes& wanted)
     {
-        tree.rewind(r.now);
-        return tree;
-    }
-    velm_simulation& next()
-    {
-        tree.rewind(r.next);
+        if (at != &wanted)
+            tree.rewind(wanted), at = &wanted;
         return tree;
     }
 };
@@ -407,25 +408,90 @@ find_latest(finder& f)
         latest_refused(f, *refusal);
 }
 
-// The updates unpacked below tz/: those no link names, and what is wrong
-// inside those the links name.
+// A few of many names, for a message: "a, b, c and 4 more".
+std::string
+some_of(const std::vector<std::string>& names)
+{
+    std::string out;
+    for (size_t i = 0; i < names.size() && i < 3; ++i)
+        out += (i == 0 ? "" : ", ") + names[i];
+    return names.size() > 3 ? out + " and " + std::to_string(names.size() - 3) + " more" : out;
+}
+
+// What lies below tz/ and beside the links that no link names, or that a
+// cut stage left: one finding for each kind, however many there are, all
+// cleared by tzlinks-update prune.
+void
+find_unnamed(finder& f)
+{
+    velm_simulation& tree = f.now();
+    std::set<std::string> named = velm_named_updates(tree);
+    std::vector<std::string> unnamed, leftovers;
+    std::string updates = tree.where(velm_path::updates, true);
+    for (const auto& [name, entry_kind] : tree.names(updates).value_or(velm_names())) {
+        if (entry_kind != velm_entry::directory)
+            continue;
+        if (has_prefix(name, ".stage-"))
+            leftovers.push_back(velm_path::updates + name);
+        else if (named.count(velm_path::updates + name) == 0)
+            unnamed.push_back(velm_path::updates + name);
+    }
+    std::string links = std::string(velm_path::link_directory) + "/";
+    if (kind(tree, links + ".tz_latest.new") != velm_entry::absent)
+        leftovers.push_back(links + ".tz_latest.new");
+    velm_commands prune = {{velm_command::prune, "", ""}};
+    if (!unnamed.empty())
+        f.add("note", "update-unnamed", velm_path::updates,
+              some_of(unnamed) + (unnamed.size() == 1 ? " is an update" : " are updates") +
+                  " that no link names: nothing uses " + (unnamed.size() == 1 ? "it." : "them."))
+            .tries = {prune};
+    if (!leftovers.empty())
+        f.add("note", "stage-leftover", velm_path::updates,
+              some_of(leftovers) + (leftovers.size() == 1 ? " is" : " are") +
+                  " what a cut tzlinks-update stage left.")
+            .tries = {prune};
+    velm_entry lock = tree.look(links + ".tzlinks-update.lock");
+    if (lock.kind != velm_entry::absent && lock.kind != velm_entry::file)
+        f.add("warning", "update-lock-wedged", links + ".tzlinks-update.lock",
+              links + ".tzlinks-update.lock is no regular file: every tzlinks-update stage fails "
+                      "until tzlinks-update prune clears it.")
+            .tries = {prune};
+}
+
+// The first entries below path, a directory of an update in use, that
+// programs other than root cannot read: a zone file or ICU data readable
+// by root alone is as good as none to them.
+void
+unreadable_by_others(velm_simulation& tree, const std::string& path, int depth,
+                     std::vector<std::string>& found)
+{
+    for (const auto& listed : tree.names(path).value_or(velm_names())) {
+        const std::string& name = listed.first;
+        velm_entry entry = tree.look(path + "/" + name);
+        mode_t need = entry.kind == velm_entry::directory ? S_IROTH | S_IXOTH : S_IROTH;
+        if (entry.kind != velm_entry::link && (entry.mode & need) != need)
+            found.push_back(path + "/" + name);
+        else if (entry.kind == velm_entry::directory && depth < 16 && found.size() < 4)
+            unreadable_by_others(tree, path + "/" + name, depth + 1, found);
+    }
+}
+
+// What is wrong inside the updates the links name, now or after the next
+// boot.
 void
 find_updates(finder& f)
 {
     const velm_report& r = f.r;
-    std::vector<std::string> named;
+    std::set<std::string> named;
     for (const velm_text& link :
          {r.zoneinfo, r.icutz, r.tz_latest, r.next_boot.zoneinfo, r.next_boot.icutz})
-        named.push_back(update_of(link));
+        named.insert(update_of(link));
+    named.erase("");
     velm_simulation& tree = f.now();
-    for (const std::string& name : tree.names(velm_path::updates).value_or(velm_names())) {
-        std::string root = velm_path::updates + name;
-        if (std::find(named.begin(), named.end(), root) == named.end()) {
-            f.add("note", "update-unnamed", root,
-                  root + " is an update that no link names: nothing uses it.")
-                .tries = {{rm(root)}};
+    for (const std::string& root : named) {
+        if (kind(tree, root, true) != velm_entry::directory)
             continue;
-        }
+        std::string name = root.substr(sizeof velm_path::updates - 1);
         velm_version_match match = velm_version_match_text(name);
         std::string word = velm_first_word(tree, root + "/zoneinfo/+VERSION");
         if (match.size == 5 && !word.empty() && word != match.group[1] + match.group[2])
@@ -439,12 +505,20 @@ find_updates(finder& f)
         if (!data.empty() && !velm_icu_data(tree, data))
             f.add("warning", "icu-data-bad", data,
                   data +
-                      (tree.read(data, 1).value_or("").empty() ? " is empty"
-                                    : " is no ICU data (it lacks the header "
-                                      "ICU's data files begin with)") +
+                      (tree.read(data, 1).value_or("").empty()
+                           ? " is empty"
+                           : " is no ICU data (it lacks the header ICU's data files begin with)") +
                       ": the boot goes by its name alone and uses it, and ICU's readers then "
                       "fail.")
                 .manual = "ICU data built by ICU's tools as " + data;
+        std::vector<std::string> unreadable;
+        unreadable_by_others(tree, root, 0, unreadable);
+        if (!unreadable.empty())
+            f.add("warning", "update-unreadable", root,
+                  some_of(unreadable) + ", of the update " + root +
+                      ", cannot be read by programs that do not run as root: to them its zones "
+                      "or its ICU data are missing.")
+                .manual = "read access for others to " + root + " (chmod -R a+rX " + root + ")";
     }
 }
 
@@ -651,6 +725,7 @@ find_problems(velm_simulation& tree, velm_report& r)
     find_system_version(f);
     find_live(f);
     find_latest(f);
+    find_unnamed(f);
     find_updates(f);
     find_next_boot(f);
     find_localtime(f);

@@ -122,7 +122,7 @@ read_link_at(int dir, const std::string& name, std::string& target)
 }
 
 int
-names_in(int dir, std::vector<std::string>& names)
+names_in(int dir, std::vector<std::string>& names, std::vector<unsigned char>* types)
 {
     int listing = openat(dir, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     DIR* entries = listing < 0 ? nullptr : fdopendir(listing);
@@ -135,8 +135,11 @@ names_in(int dir, std::vector<std::string>& names)
     errno = 0;
     // cppcheck-suppress readdirCalled ; one thread, one directory stream
     while (const struct dirent* entry = readdir(entries)) {
-        if (strcmp(entry->d_name, ".") != 0 && strcmp(entry->d_name, "..") != 0)
-            names.emplace_back(entry->d_name);
+        if (strcmp(entry->d_name, ".") == 0 || strcmp(entry->d_name, "..") == 0)
+            continue;
+        names.emplace_back(entry->d_name);
+        if (types != nullptr)
+            types->push_back(entry->d_type);
     }
     int error = errno;
     closedir(entries);

@@ -80,7 +80,9 @@ int read_link_at(int dir, const std::string& name, std::string& target);
 
 // The names in the directory dir, but for "." and "..": 0, or the errno of
 // the listing that failed (names then holds what was read). Never warns.
-int names_in(int dir, std::vector<std::string>& names);
+// With types, each name's d_type too (DT_UNKNOWN where the file system
+// does not tell).
+int names_in(int dir, std::vector<std::string>& names, std::vector<unsigned char>* types = nullptr);
 
 // Replaces the content of the regular file at path, created when missing,
 // and leaves anything else there alone: a link (not followed), a FIFO, a

@@ -50,13 +50,22 @@ cut(const std::string& text)
 }
 
 // Whether the character at text[i], n bytes long, is a control character:
-// C0 (and DEL) or C1 (U+0080 to U+009F, which terminals obey too).
+// C0 (and DEL) or C1 (U+0080 to U+009F, which terminals obey too); or one
+// that reorders or breaks a line where it is shown: U+061C, U+200E, U+200F,
+// U+2028 to U+202E and U+2066 to U+2069, which could make a path read as
+// another.
 static bool
 control(const std::string& text, size_t i, size_t n)
 {
-    auto c = static_cast<unsigned char>(text[i]);
-    return c < 0x20 || c == 0x7f ||
-           (n == 2 && c == 0xc2 && static_cast<unsigned char>(text[i + 1]) < 0xa0);
+    auto at = [&text, i](size_t k) { return static_cast<unsigned char>(text[i + k]); };
+    if (n == 1)
+        return at(0) < 0x20 || at(0) == 0x7f;
+    if (n == 2)
+        return (at(0) == 0xc2 && at(1) < 0xa0) || (at(0) == 0xd8 && at(1) == 0x9c);
+    bool general = n == 3 && at(0) == 0xe2 && at(1) == 0x80, isolates = n == 3 && at(0) == 0xe2 &&
+                                                                          at(1) == 0x81;
+    return (general && ((at(2) >= 0x8e && at(2) <= 0x8f) || (at(2) >= 0xa8 && at(2) <= 0xae))) ||
+           (isolates && at(2) >= 0xa6 && at(2) <= 0xa9);
 }
 
 // Valid UTF-8 as it is; a control character, or a byte that is not part of

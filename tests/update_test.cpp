@@ -19,6 +19,16 @@ namespace {
 
 using nlohmann::json;
 
+// The ids of a report's findings, in order.
+std::vector<std::string>
+ids(const json& report)
+{
+    std::vector<std::string> found;
+    for (const json& finding : report["findings"])
+        found.push_back(finding["id"]);
+    return found;
+}
+
 std::string
 update(const std::string& args)
 {
@@ -142,6 +152,7 @@ TEST_P(update_tool, row)
     EXPECT_EQ(got, r.expect) << o.out << o.err;
     auto after = snapshot();
     after.erase("/var/db/timezone/.tzlinks-update.lock");
+    before.erase("/var/db/timezone/.tzlinks-update.lock");
     if (checking || o.status != 0) {
         EXPECT_EQ(changes(before, after), std::vector<std::string>()) << "it changed the tree";
     }
@@ -210,6 +221,60 @@ TEST(update, command_line)
             << args;
     }
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
+}
+
+// Sources no update resembles, or that a writer changes while they are
+// staged: 5,000 levels, refused without a crash; a zone file swapped with a
+// link to /etc/shadow a hundred times over while it is staged, never
+// staged as that link. What is staged is what was checked.
+TEST(update, hostile_sources)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime; live_system; "
+                           "update_source /dev/shm/deep 2025b 44l; update_source /dev/shm/race "
+                           "2025b 44l"));
+    // Made by descriptor: no shell can cd so deep.
+    run("cd /dev/shm/deep/zoneinfo && exec python3 -c 'import os\nfd = os.open(\".\", 0)\n"
+        "for i in range(5000):\n    os.mkdir(\"d\", dir_fd=fd); fd = os.open(\"d\", 0, dir_fd=fd)'");
+    outcome deep = run(update("stage /dev/shm/deep"));
+    EXPECT_EQ(deep.status, 2);
+    std::string deepest = "/dev/shm/deep/zoneinfo";
+    for (int level = 0; level < 16; ++level)
+        deepest += "/d";
+    EXPECT_NE(deep.out.find(deepest + " lies deeper than 16 levels"), std::string::npos) << deep.out;
+    run("cd /dev/shm/race/zoneinfo/Europe && { while :; do ln -s /etc/shadow P; mv -T P Paris; "
+        "cp ../America/Los_Angeles P; mv -T P Paris; done & echo $! >/dev/shm/writer; }");
+    int staged = 0;
+    for (int round = 0; round < 100; ++round)
+        staged += run(update("stage /dev/shm/race --as 2025b.1." + std::to_string(round))).status == 0;
+    run("kill $(cat /dev/shm/writer)");
+    EXPECT_EQ(run("find /var/db/timezone/tz -type l").out, "") << "a link out of the update staged";
+    EXPECT_GT(staged, 0);
+    std::cout << "RACE rounds 100 staged " << staged << "\n";
+}
+
+// Entries in tz/ by the thousand: the report, check and stage cost time
+// linear in them, and the updates no link names are one finding, with one
+// command. (Timed only in a plain build.)
+TEST(update, many_updates)
+{
+    if (getenv("TZLINKS_RUNNER") != nullptr || TZLINKS_SANITIZED)
+        GTEST_SKIP() << "measured only in a plain build";
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; etc_localtime; live_update 2024a.1.0; "
+                           "update_source /dev/shm/src 2025b 44l"));
+    for (const char* count : {"1000", "100000"}) {
+        run(std::string("cd /var/db/timezone/tz && seq ") + count + " | xargs mkdir -p");
+        outcome status = run(program(TZLINKS_STATUS_BINARY, "--json")),
+                check = run(update("check /dev/shm/src")),
+                stage = run(update("stage /dev/shm/src --as 2025b.1." + std::string(count)));
+        json report = json::parse(status.out);
+        EXPECT_EQ(ids(report), std::vector<std::string>{"update-unnamed"});
+        EXPECT_LT(status.seconds, 2.0) << count;
+        EXPECT_LT(check.seconds + stage.seconds, 2.0) << count;
+        std::cout << "MANY " << count << " status " << status.seconds << " s, check "
+                  << check.seconds << " s, stage " << stage.seconds << " s\n";
+    }
 }
 
 // An image whose /var/db/timezone is an absolute link, as where /var is

@@ -15,6 +15,7 @@
 #include <cstring>
 #include <err.h>
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <sysexits.h>
 #include <unistd.h>
 
@@ -98,6 +99,27 @@ check(const velm_device& device, int src, const std::string& name, const std::st
     return written(j.verdict);
 }
 
+// Whether the directory fd lies at or below the directory top, going up
+// by ".." as far as the root.
+static bool
+below(int fd, int top)
+{
+    struct stat target, st, up;
+    int at = openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    bool inside = false;
+    for (int steps = 0; at >= 0 && !inside && steps < 4096 && fstat(top, &target) == 0; ++steps) {
+        int parent = fstat(at, &st) == 0 ? openat(at, "..", O_RDONLY | O_DIRECTORY | O_CLOEXEC) : -1;
+        inside = st.st_dev == target.st_dev && st.st_ino == target.st_ino;
+        (void)close(at);
+        at = parent;
+        if (at >= 0 && fstat(at, &up) == 0 && up.st_dev == st.st_dev && up.st_ino == st.st_ino)
+            break; // the root: ".." is itself
+    }
+    if (at >= 0)
+        (void)close(at);
+    return inside;
+}
+
 static int
 run(const std::string& command, const std::string& source,
     const std::map<std::string, std::string>& given)
@@ -117,13 +139,21 @@ run(const std::string& command, const std::string& source,
     std::string version = as != given.end() ? as->second
                           : release.empty() ? ""
                                             : velm_release_version(release);
-    if (command == "check")
-        return check(device, src, source, version, given.count("json") != 0);
     int links = device.open_directory(velm_path::link_directory);
     if (links < 0) {
         warn("cannot open %s", shown(device.root + velm_path::link_directory).c_str());
         return EX_IOERR;
     }
+    // An update copied from inside the device, or from a tree that holds
+    // it, would be copied into itself.
+    if (src >= 0 && (below(src, links) || below(links, src))) {
+        warnx("%s and %s lie one inside the other: an update comes from outside the device",
+              shown(source).c_str(),
+              shown(device.named(velm_path::link_directory)).c_str());
+        return refused;
+    }
+    if (command == "check")
+        return check(device, src, source, version, given.count("json") != 0);
     auto wait = given.find("wait");
     int seconds = wait == given.end() ? 60 : atoi(wait->second.c_str());
     if (int status = take_lock(device, links, seconds, command == "prune"); status != 0)

@@ -23,27 +23,6 @@
 #include <sysexits.h>
 #include <unistd.h>
 
-// The updates the links name: 0, or the errno of a read that failed.
-static int
-named_updates(const velm_device& device, std::set<std::string>& named, std::string& unread)
-{
-    velm_simulation tree(device.fd);
-    for (const char* link :
-         {velm_path::zoneinfo_link, velm_path::icutz_link, velm_path::latest_link}) {
-        std::string canonical;
-        named.insert(velm_update_of(link_at(tree, link).value_or("")));
-        tree.look(link, true, &canonical);
-        named.insert(velm_update_of(canonical));
-    }
-    named.erase("");
-    // A loop of links names nothing; any other failure could hide a name.
-    for (const auto& [path, error] : tree.unread()) {
-        if (error != ELOOP && error != ENAMETOOLONG && error != EFBIG)
-            return unread = path, error;
-    }
-    return 0;
-}
-
 // Removes name below dir, or says it would: 0, or EX_IOERR (said).
 static int
 remove_named(int dir, const std::string& name, const std::string& path, bool dry_run)
@@ -62,10 +41,11 @@ remove_named(int dir, const std::string& name, const std::string& path, bool dry
 int
 prune(const velm_device& device, int links, bool dry_run)
 {
-    std::set<std::string> named;
+    velm_simulation tree(device.fd);
     std::string unread;
-    if (int error = named_updates(device, named, unread); error != 0) {
-        errno = error;
+    std::set<std::string> named = velm_named_updates(tree, &unread);
+    if (!unread.empty()) {
+        errno = tree.unread().at(unread);
         warn("cannot read %s; nothing was removed", shown(device.named(unread)).c_str());
         return EX_IOERR;
     }
