@@ -6,6 +6,7 @@
 #include "support/paths.h"
 #include "support/prefix.h"
 
+#include <algorithm>
 #include <cerrno>
 
 std::string
@@ -17,6 +18,16 @@ velm_update_of(const std::string& path)
     return path.substr(0, path.find('/', prefix));
 }
 
+std::string
+velm_update_at(velm_simulation& tree, const std::string& path, bool follow)
+{
+    std::string updates = tree.where(velm_path::updates, true) + "/", at = tree.where(path, follow);
+    if (!has_prefix(at, updates.c_str()) || at.size() == updates.size())
+        return "";
+    size_t end = std::min(at.find('/', updates.size()), at.size());
+    return velm_path::updates + at.substr(updates.size(), end - updates.size());
+}
+
 std::set<std::string>
 velm_named_updates(velm_simulation& tree, std::string* unread)
 {
@@ -25,7 +36,7 @@ velm_named_updates(velm_simulation& tree, std::string* unread)
          {velm_path::zoneinfo_link, velm_path::icutz_link, velm_path::latest_link}) {
         velm_entry entry = tree.look(link);
         named.insert(velm_update_of(entry.kind == velm_entry::link ? entry.text : ""));
-        named.insert(velm_update_of(tree.where(link, true)));
+        named.insert(velm_update_at(tree, link));
     }
     named.erase("");
     // A loop of links names nothing; any other failure could hide a name.

@@ -14,6 +14,10 @@
 // The update a path lies in, /var/db/timezone/tz/NAME; "" for a path in
 // none.
 std::string velm_update_of(const std::string& path);
+// The update a path leads into, resolved inside the tree (following its
+// last link too, or not), as the boot names updates: /var/db/timezone/tz/
+// NAME, whatever links lead there; "" for none.
+std::string velm_update_at(velm_simulation& tree, const std::string& path, bool follow = true);
 // The updates the links zoneinfo, icutz and tz_latest name, read as the
 // boot reads them or followed inside the tree. A read that fails is named
 // in unread, if given: what it hides could be a name.

@@ -326,9 +326,9 @@ latest_not_understood(finder& f, const velm_entry& entry)
                   (f.r.next_boot.abandoned ? "gives up its choice and links the system data"
                                            : what_it_does(f.r.next_boot)) +
                   ".");
-    std::string meant = tree.where(std::string(velm_path::link_directory) + "/" + target);
-    if (entry.kind == velm_entry::link && !has_prefix(target, "/") &&
-        velm_update_of(meant) == meant && kind(tree, meant, true) == velm_entry::directory)
+    std::string meant = velm_update_at(tree, velm_path::latest_link);
+    if (entry.kind == velm_entry::link && !has_prefix(target, "/") && !meant.empty() &&
+        tree.where(meant, true) == tree.where(velm_path::latest_link, true))
         found.tries.push_back({ln(meant, velm_path::latest_link)});
     found.tries.push_back({rm(velm_path::latest_link)});
 }
@@ -732,5 +732,4 @@ find_problems(velm_simulation& tree, velm_report& r)
     find_etc_localtime(f);
     find_record(f);
     find_legacy(f);
-    tree.rewind(r.now);
 }

@@ -112,7 +112,6 @@ survey(velm_simulation& tree, const std::string& root)
     r.next = tree.checkpoint();
     if (r.next_boot.exit_status == 0)
         r.after_next = simulate_boot(tree);
-    tree.rewind(now);
     note_unread(tree.unread(), r);
     find_problems(tree, r);
     tree.rewind(now);

@@ -166,6 +166,7 @@ TEST(status, command_line)
         {"--version", 0, "tzlinks-status " TZLINKS_VERSION "\n", ""},
         {"-x", 64, "", "tzlinks-status: unknown argument: -x\n" + usage},
         {"--metricsfoo", 64, "", "tzlinks-status: unknown argument: --metricsfoo\n" + usage},
+        {"--js", 64, "", "tzlinks-status: unknown argument: --js\n" + usage},
         {"--metrics=", 64, "", "tzlinks-status: missing value after: --metrics=\n" + usage},
         {"--json --root", 64, "", "tzlinks-status: missing directory after: --root\n" + usage},
         {"--root=/no", 66, "", "tzlinks-status: cannot read /no: No such file or directory\n"},
@@ -213,6 +214,36 @@ TEST(status, command_line)
     outcome full = run(program(TZLINKS_STATUS_BINARY, ">/dev/full"));
     EXPECT_EQ(std::to_string(full.status) + full.err,
               "74tzlinks-status: cannot write the report: No space left on device\n");
+}
+
+// What cannot be read is said to be so, never taken for an absence: the
+// system's ICU data unreadable to the boot's user marks the system data
+// (and no other) unreadable; another user than root is told it may read
+// less than the boot; every listing failing (EIO) leaves a finding for
+// each directory the boot lists, never an empty one.
+TEST(status, unreadable)
+{
+    ASSERT_TRUE(fresh_tree());
+    ASSERT_TRUE(build_tree("system_dataset 2023c 44l; live_system; update_dataset 2024a 44l; "
+                           "latest 2024a; chmod 000 /usr/share/icu"));
+    json report = json::parse(run("exec setpriv --inh-caps=-dac_override,-dac_read_search "
+                                  "--bounding-set=-dac_override,-dac_read_search " +
+                                  program(TZLINKS_STATUS_BINARY, "--json").substr(5))
+                                  .out);
+    EXPECT_EQ(json({report["system"]["unreadable"], report["latest"]["unreadable"]}),
+              json({true, false}));
+    EXPECT_NE(run("exec unshare -U --map-user=1000 --map-group=1000 sh -c '" +
+                  program(TZLINKS_STATUS_BINARY) + "'")
+                  .out.find("note unreadable: /usr/share/icu cannot be read: Permission denied "
+                            "(by this user; the boot, as root, may read it)"),
+              std::string::npos);
+    std::string failing = run("exec strace -f -qq -o /dev/null -e inject=getdents64:error=EIO " +
+                              program(TZLINKS_STATUS_BINARY).substr(5))
+                              .out;
+    EXPECT_NE(failing.find("warning unreadable: /var/db/timezone/tz/2024a/icutz cannot be read: "
+                           "Input/output error"),
+              std::string::npos)
+        << failing;
 }
 
 // Whatever a tree holds, tzlinks keeps no update's +VERSION, and

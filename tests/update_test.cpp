@@ -211,6 +211,8 @@ TEST(update, command_line)
         {"prune --dry-run --dry-run", "64 tzlinks-update: given twice: --dry-run\n"},
         {"prune --dry", "64 tzlinks-update: unknown argument: --dry\n"},
         {"check /var/tmp/src --force", "64 tzlinks-update: not an option of check: --force\n"},
+        {"check /var/tmp/src extra", "64 tzlinks-update: unknown argument: extra\n"},
+        {"--version", "0 "},
         {"stage /var/tmp/src --wait 1", "75 tzlinks-update: /var/db/timezone/.tzlinks-update.lock "
                                         "is held by process " + holder.substr(0, holder.size() - 1) +
                                             ": gave up after 1 s\n"},
@@ -221,6 +223,22 @@ TEST(update, command_line)
             << args;
     }
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
+    // Names are shown escaped.
+    run("mkdir \"/var/db/timezone/tz/x$(printf '\\033[31m\\342\\200\\256\\nz')\"");
+    EXPECT_EQ(run(update("prune")).out, "Removed /var/db/timezone/tz/x\\x1b[31m\\xe2\\x80\\xae\\x0az\n");
+    // A file system mounted inside an update no link names is left as it
+    // is, and named; a full one is said to be full.
+    run("mkdir -p /var/db/timezone/tz/old/zoneinfo && mount -t tmpfs m "
+        "/var/db/timezone/tz/old/zoneinfo && touch /var/db/timezone/tz/old/zoneinfo/kept");
+    outcome mounted = run(update("prune"));
+    EXPECT_EQ(std::to_string(mounted.status) + mounted.err,
+              "74tzlinks-update: cannot remove /var/db/timezone/tz/old/zoneinfo: Device or resource "
+              "busy\n");
+    EXPECT_EQ(run("ls /var/db/timezone/tz/old/zoneinfo").out, "kept\n");
+    run("mount -t tmpfs -o size=4k full /var/db/timezone/tz");
+    outcome full = run(update("stage /var/tmp/src --as 2025b.2.0"));
+    EXPECT_EQ(full.status, 74);
+    EXPECT_NE(full.err.find(": No space left on device\n"), std::string::npos) << full.err;
 }
 
 // Sources no update resembles, or that a writer changes while they are
@@ -291,7 +309,7 @@ TEST(update, image_with_absolute_link)
                            "update_dataset 2023d 44l; mkdir -p /var/lib; mv $tz /var/lib/timezone; "
                            "update_source /var/tmp/src 2025b 44l"));
     std::string decoy = run("find /var/lib/timezone -printf '%p %C@\\n'").out,
-                image = " --root /dev/shm/image", real = "/dev/shm/image/var/lib/timezone";
+                image = " --root /dev/shm/./image", real = "/dev/shm/image/var/lib/timezone";
     json judged = json::parse(run(update("check /var/tmp/src --json" + image)).out);
     EXPECT_EQ(judged["verdict"], 0);
     outcome staged = run(update("stage /var/tmp/src" + image));
@@ -300,6 +318,10 @@ TEST(update, image_with_absolute_link)
     EXPECT_EQ(json::parse(run(program(TZLINKS_STATUS_BINARY, "--json" + image)).out)["next_boot"],
               judged["next_boot"]);
     EXPECT_EQ(run(update("prune" + image)).out, "Removed " + real + "/tz/2023d\n");
+    // A repair links to the device's own path, in the image's real place.
+    run("ln -sfn tz/2025b.1.0 " + real + "/tz_latest");
+    EXPECT_EQ(run(program(TZLINKS_STATUS_BINARY, "--commands" + image)).out,
+              "ln -sfn /var/db/timezone/tz/2025b.1.0 " + real + "/tz_latest\n");
     EXPECT_EQ(run("ls -A " + real + "/tz " + real + "/.tzlinks-update.lock").status, 0);
     EXPECT_EQ(run("find /var/lib/timezone -printf '%p %C@\\n'").out, decoy);
 }
