@@ -119,6 +119,15 @@ schema_breaks(const std::vector<std::string>& reports)
         .out;
 }
 
+std::vector<std::string>
+ids(const nlohmann::json& report)
+{
+    std::vector<std::string> found;
+    for (const nlohmann::json& finding : report["findings"])
+        found.push_back(finding["id"]);
+    return found;
+}
+
 std::map<std::string, std::string>
 snapshot(bool with_times)
 {

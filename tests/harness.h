@@ -8,6 +8,7 @@
 #define TZLINKS_TESTS_HARNESS_H
 
 #include <map>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -43,6 +44,9 @@ std::string tzlinks(const std::string& inject = "", const std::string& trace = "
 // python3-jsonschema says it; nothing when they keep to it. (Checked in a
 // plain build: the others write the very same reports.)
 std::string schema_breaks(const std::vector<std::string>& reports);
+
+// The ids of a report's findings, in order.
+std::vector<std::string> ids(const nlohmann::json& report);
 
 // Every entry below /var and /usr/share, by path: "->target" for a link,
 // "=content" for a file, "/" for a directory, "|" for anything else; with

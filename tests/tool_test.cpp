@@ -27,15 +27,6 @@ status_report(const std::string& args = "")
     return json::parse(run(program(TZLINKS_STATUS_BINARY, "--json " + args)).out);
 }
 
-// The ids of a report's findings, in order.
-std::vector<std::string>
-ids(const json& report)
-{
-    std::vector<std::string> found;
-    for (const json& finding : report["findings"])
-        found.push_back(finding["id"]);
-    return found;
-}
 
 std::string
 joined(const std::vector<std::string>& words)

@@ -19,15 +19,6 @@ namespace {
 
 using nlohmann::json;
 
-// The ids of a report's findings, in order.
-std::vector<std::string>
-ids(const json& report)
-{
-    std::vector<std::string> found;
-    for (const json& finding : report["findings"])
-        found.push_back(finding["id"]);
-    return found;
-}
 
 std::string
 update(const std::string& args)
