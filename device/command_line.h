@@ -11,17 +11,17 @@
 
 // A long option: without a value, with one, or with one that may be left out.
 constexpr option
-flag(const char* name)
+flag(const char* name) noexcept
 {
     return {name, no_argument, nullptr, 0};
 }
 constexpr option
-valued(const char* name)
+valued(const char* name) noexcept
 {
     return {name, required_argument, nullptr, 0};
 }
 constexpr option
-maybe_valued(const char* name)
+maybe_valued(const char* name) noexcept
 {
     return {name, optional_argument, nullptr, 0};
 }

@@ -38,7 +38,9 @@ velm_device::open_directory(const std::string& path, std::string* real) const
     if (real != nullptr)
         *real = root + canonical;
     int directory = openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    for (size_t at = 1; directory >= 0 && at < canonical.size();) {
+    for (size_t at = 1; at < canonical.size();) {
+        if (directory < 0)
+            return -1;
         size_t end = std::min(canonical.find('/', at), canonical.size());
         int next = openat(directory, canonical.substr(at, end - at).c_str(),
                           O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);

@@ -164,10 +164,10 @@ velm_entry
 velm_simulation::look(const std::string& path, bool follow, std::string* canonical)
 {
     int saved = errno;
-    std::string where;
-    velm_entry entry = resolve(path, follow, where);
+    std::string resolved;
+    velm_entry entry = resolve(path, follow, resolved);
     if (canonical != nullptr)
-        *canonical = where;
+        *canonical = resolved;
     errno = saved;
     return entry;
 }
@@ -334,16 +334,16 @@ velm_simulation::settle()
 int
 velm_simulation::may_change_in(const std::string& directory)
 {
-    std::string at = directory;
-    velm_entry entry = entry_at(at);
+    std::string real = directory;
+    velm_entry entry = entry_at(real);
     while (entry.fresh || entry.kind != velm_entry::directory) {
-        if (at.empty())
+        if (real.empty())
             return 0;
-        entry = entry_at(at = parent_of(at));
+        entry = entry_at(real = parent_of(real));
     }
     if ((mount_flags(entry) & ST_RDONLY) != 0)
         return EROFS;
-    if (!as_root || at != directory)
+    if (!as_root || real != directory)
         return 0;
     return faccessat(entry.base, relative(entry.real).c_str(), W_OK | X_OK, AT_EACCESS) == 0
                ? 0

@@ -46,16 +46,15 @@ read_state(velm_simulation& tree, velm_report& r)
         r.localtime_zone = r.localtime->substr(live_prefix.size());
     velm_caught_messages quiet; // the messages of building them are the boot's to write
     velm_calls_in_use simulated(tree);
-    std::string live, latest;
     try {
-        live = current_dataset_path();
+        std::string live = current_dataset_path();
         r.zoneinfo_understood = true;
         r.live = facts_at(live);
     } catch (...) {
         // No zoneinfo link that the boot tool understands.
     }
     try {
-        latest = latest_dataset_path();
+        std::string latest = latest_dataset_path();
         if (!latest.empty())
             r.latest = facts_at(latest);
     } catch (...) {

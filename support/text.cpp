@@ -92,20 +92,20 @@ shown(const std::string& whole)
 // the surrogate escape: decoders that know it give the byte back. A text
 // longer than longest_text is cut, but for a command, which has to run.
 std::string
-json_text(const std::string& whole, bool whole_text)
+json_text(const std::string& text, bool whole)
 {
-    std::string text = whole_text ? whole : cut(whole), out = "\"";
-    for (size_t i = 0; i < text.size();) {
-        size_t n = utf8_length(text, i);
-        auto c = static_cast<unsigned char>(text[i]);
+    std::string kept = whole ? text : cut(text), out = "\"";
+    for (size_t i = 0; i < kept.size();) {
+        size_t n = utf8_length(kept, i);
+        auto c = static_cast<unsigned char>(kept[i]);
         if (n == 0)
             out += hex("\\udc%02x", c), n = 1;
         else if (c == '"' || c == '\\')
-            out += std::string("\\") + text[i];
+            out += std::string("\\") + kept[i];
         else if (c < 0x20)
             out += hex("\\u%04x", c);
         else
-            out.append(text, i, n);
+            out.append(kept, i, n);
         i += n;
     }
     return out + "\"";

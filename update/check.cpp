@@ -115,7 +115,7 @@ examine(velm_simulation& tree, const std::string& root, const std::string& name,
 // the device, what stops the judgement. A loop or a name too long is the
 // tree's shape, which the boot meets as well, not a failure.
 void
-note_unread(velm_simulation& tree, const std::string& root, const std::string& name,
+note_unread(const velm_simulation& tree, const std::string& root, const std::string& name,
             velm_source& walked, velm_judgement& j)
 {
     for (const auto& [path, error] : tree.unread()) {

@@ -43,10 +43,10 @@ static const option options[] = {valued("as"),   flag("json"),    flag("force"),
                                   valued("wait"), valued("root"),  flag("dry-run"),
                                   flag("help"),   flag("version"), {}};
 // The commands, and the options each takes.
-static const std::pair<const char*, std::set<std::string>> commands[] = {
-    {"check", {"as", "json", "root"}},
-    {"stage", {"as", "force", "wait", "root"}},
-    {"prune", {"dry-run", "wait", "root"}},
+static const char* const commands[][2] = {
+    {"check", " as json root "},
+    {"stage", " as force wait root "},
+    {"prune", " dry-run wait root "},
 };
 
 // The options given that the command does not take: a usage error.
@@ -57,7 +57,7 @@ check_options(const std::string& command, const std::map<std::string, std::strin
         if (command != name)
             continue;
         for (const auto& [option, value] : given) {
-            if (takes.count(option) == 0)
+            if (strstr(takes, (" " + option + " ").c_str()) == nullptr)
                 return usage_error(usage, ("not an option of " + command).c_str(), "--" + option);
         }
         auto wait = given.find("wait");
@@ -155,7 +155,8 @@ run(const std::string& command, const std::string& source,
     if (command == "check")
         return check(device, src, source, version, given.count("json") != 0);
     auto wait = given.find("wait");
-    int seconds = wait == given.end() ? 60 : atoi(wait->second.c_str());
+    int seconds =
+        wait == given.end() ? 60 : static_cast<int>(strtol(wait->second.c_str(), nullptr, 10));
     if (int status = take_lock(device, links, seconds, command == "prune"); status != 0)
         return status;
     int status = command == "prune"

@@ -35,9 +35,17 @@ struct walker {
     velm_source& found;
     dev_t device;
 
-    void unsafe(const std::string& path, const std::string& why)
+    // An entry left out, and why: the walk goes on.
+    bool unsafe(const std::string& path, const std::string& why)
     {
         note_unsafe(found, name, path, why);
+        return true;
+    }
+    // A copy that could not be written, said: the walk stops.
+    bool failed(const std::string& path)
+    {
+        warn("cannot copy %s", shown(name + path).c_str());
+        return false;
     }
     bool walk(int from, int to, const std::string& at, int depth);
     bool entry(int from, int to, const std::string& at, const std::string& child, int depth);
@@ -80,9 +88,7 @@ walker::file(int in, int to, const std::string& path)
         unsafe(path, "grew while it was copied");
     if (out >= 0 && close(out) != 0)
         copied = false;
-    if (!copied)
-        warn("cannot copy %s", shown(name + path).c_str());
-    return copied;
+    return copied || failed(path);
 }
 
 bool
@@ -91,35 +97,34 @@ walker::entry(int from, int to, const std::string& at, const std::string& child,
     std::string path = at + "/" + child, why;
     struct stat st;
     if (fstatat(from, child.c_str(), &st, AT_SYMLINK_NOFOLLOW) != 0)
-        return unsafe(path, std::string("cannot be looked at: ") + strerror(errno)), true;
+        return unsafe(path, std::string("cannot be looked at: ") + strerror(errno));
     if (st.st_dev != device)
-        return unsafe(path, "lies on another file system"), true;
+        return unsafe(path, "lies on another file system");
     if (S_ISLNK(st.st_mode)) {
         std::string target;
         if (int error = velm_fs::read_link_at(from, child, target); error != 0)
-            return unsafe(path, std::string("cannot be read: ") + strerror(error)), true;
+            return unsafe(path, std::string("cannot be read: ") + strerror(error));
         found.links.push_back(path);
         if (symlinkat(target.c_str(), to, child.c_str()) != 0)
-            return warn("cannot copy %s", shown(name + path).c_str()), false;
+            return failed(path);
         return true;
     }
     if (!S_ISDIR(st.st_mode) && !S_ISREG(st.st_mode))
         return unsafe(path, S_ISFIFO(st.st_mode)   ? "is a FIFO"
                             : S_ISSOCK(st.st_mode) ? "is a socket"
-                                                   : "is a device"),
-               true;
+                                                   : "is a device");
     if (S_ISDIR(st.st_mode) && depth >= deepest)
-        return unsafe(path, "lies deeper than " + std::to_string(deepest) + " levels"), true;
+        return unsafe(path, "lies deeper than " + std::to_string(deepest) + " levels");
     if (S_ISREG(st.st_mode) &&
         (st.st_size > largest_file || (found.bytes += static_cast<unsigned long long>(
                                            st.st_size)) > largest_update))
-        return unsafe(path, "is larger than an update's file can be"), true;
+        return unsafe(path, "is larger than an update's file can be");
     int in = reopen(from, child, st, S_ISDIR(st.st_mode) ? directory_flags
                                                          : O_RDONLY | O_NOFOLLOW | O_NONBLOCK |
                                                                O_CLOEXEC,
                     why);
     if (in < 0)
-        return unsafe(path, why), true;
+        return unsafe(path, why);
     bool done = true;
     if (S_ISREG(st.st_mode)) {
         done = file(in, to, path);
@@ -127,10 +132,10 @@ walker::entry(int from, int to, const std::string& at, const std::string& child,
         int out = -1;
         if (mkdirat(to, child.c_str(), 0700) != 0 ||
             (out = openat(to, child.c_str(), directory_flags)) < 0)
-            done = (warn("cannot copy %s", shown(name + path).c_str()), false);
+            done = failed(path);
         done = done && walk(in, out, path, depth + 1);
         if (done && fchmod(out, 0755) != 0)
-            done = (warn("cannot copy %s", shown(name + path).c_str()), false);
+            done = failed(path);
         if (out >= 0)
             (void)close(out);
     }
@@ -181,8 +186,10 @@ bool
 walk_source(int src, int to, const std::string& name, velm_source& found)
 {
     struct stat st;
-    if (fstat(src, &st) != 0)
-        return warn("cannot read %s", shown(name).c_str()), false;
+    if (fstat(src, &st) != 0) {
+        warn("cannot read %s", shown(name).c_str());
+        return false;
+    }
     walker w{name, found, st.st_dev};
     return w.walk(src, to, "", 0);
 }
