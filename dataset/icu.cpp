@@ -46,7 +46,7 @@ velm_icu_schema_in_name(const std::string& name)
 // counts; links, directories and whatever lies deeper do not. The first
 // match in directory order wins.
 static std::string
-first_data_file_in(int directory, const std::string& path)
+first_data_file_in(int directory, const std::string& path, std::string& schema)
 {
     alignas(struct dirent64) char buffer[8192];
     ssize_t n;
@@ -55,7 +55,8 @@ first_data_file_in(int directory, const std::string& path)
             const auto* entry = reinterpret_cast<const struct dirent64*>(buffer + at);
             at += entry->d_reclen;
             struct stat st;
-            if (velm_icu_schema_in_name(entry->d_name).empty())
+            schema = velm_icu_schema_in_name(entry->d_name);
+            if (schema.empty())
                 continue;
             if (fstatat(directory, entry->d_name, &st, AT_SYMLINK_NOFOLLOW) != 0)
                 system_calls().io_failed(path + "/" + entry->d_name, errno);
@@ -65,18 +66,22 @@ first_data_file_in(int directory, const std::string& path)
     }
     if (n < 0)
         system_calls().io_failed(path, errno);
+    schema.clear();
     return std::string();
 }
 
 std::string
-velm_icu_data_file(const std::string& directory)
+velm_icu_data_file(const std::string& directory, std::string* schema)
 {
+    std::string name, spelled;
     int fd =
         system_calls().open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC);
-    if (fd < 0)
-        return std::string();
-    std::string name = first_data_file_in(fd, directory);
-    (void)close(fd);
+    if (fd >= 0) {
+        name = first_data_file_in(fd, directory, spelled);
+        (void)close(fd);
+    }
+    if (schema != nullptr)
+        *schema = spelled;
     return name;
 }
 
@@ -85,7 +90,7 @@ velm_icu_data_file(const std::string& directory)
 void
 velm_icu::find_update_schema()
 {
-    schema = velm_icu_schema_in_name(velm_icu_data_file(data_dir));
+    (void)velm_icu_data_file(data_dir, &schema);
     if (schema.empty()) {
         // A walk that finds nothing ends with errno at 0: this warning,
         // and those after it that follow no failed call, carry that text.

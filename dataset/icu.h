@@ -15,7 +15,8 @@ std::string velm_icu_schema_in_name(const std::string& name);
 // The name of the ICU data file an update's directory holds, as the boot
 // finds it: the first, in the directory's own order, whose name spells a
 // schema and that is a regular file readable by others; "" when none is.
-std::string velm_icu_data_file(const std::string& directory);
+// schema, when given, gets the schema its name spells.
+std::string velm_icu_data_file(const std::string& directory, std::string* schema = nullptr);
 
 class velm_icu final : public velm_dataset_component {
   public:
