@@ -99,9 +99,12 @@ velm_simulation::entry_at(const std::string& canonical)
 }
 
 // The components of a path, the first last, as the walk below takes them.
+// A '/' at the end asks for a directory, as a "." after it does.
 static void
 push(std::vector<std::string>& todo, const std::string& text)
 {
+    if (!text.empty() && text.back() == '/')
+        todo.emplace_back(".");
     for (size_t end = text.size(); end > 0;) {
         size_t slash = text.rfind('/', end - 1);
         size_t begin = slash == std::string::npos ? 0 : slash + 1;
@@ -112,9 +115,10 @@ push(std::vector<std::string>& todo, const std::string& text)
 }
 
 // Walks path a component at a time, following links (the last one only
-// when asked, or when a '/' ends the path), an absolute target starting
-// again from the root and ".." never leaving it. Fails as the kernel
-// would: ENOENT, ENOTDIR, ELOOP, or what looking up an entry met.
+// when asked, or when a '/' ends the path or a link's target), an absolute
+// target starting again from the root and ".." never leaving it. Fails as
+// the kernel would: ENOENT, ENOTDIR, ELOOP, or what looking up an entry
+// met.
 velm_entry
 velm_simulation::resolve(const std::string& path, bool follow, std::string& canonical)
 {
@@ -125,10 +129,13 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
         return failed;
     std::vector<std::string> todo;
     push(todo, path);
-    bool directory_asked = path.back() == '/';
     for (int links = 0; !todo.empty();) {
         std::string name = todo.back();
         todo.pop_back();
+        if ((name == "." || name == "..") && entry.kind != velm_entry::directory) {
+            failed.error = ENOTDIR;
+            return failed;
+        }
         if (name == "..")
             canonical = parent_of(canonical);
         if (name == "." || name == "..")
@@ -140,7 +147,7 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
             trouble.emplace(entry.error == EACCES ? canonical : next, entry.error);
             return entry;
         }
-        if (entry.kind == velm_entry::link && (!todo.empty() || follow || directory_asked)) {
+        if (entry.kind == velm_entry::link && (!todo.empty() || follow)) {
             failed.error = ++links > 40 ? ELOOP : entry.text.empty() ? ENOENT : 0;
             if (failed.error == ELOOP)
                 trouble.emplace(path, ELOOP);
@@ -149,6 +156,7 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
             if (entry.text[0] == '/')
                 canonical.clear();
             push(todo, entry.text);
+            entry = entry_at(canonical); // the directory the target starts from
         } else if (!todo.empty() && entry.kind != velm_entry::directory) {
             failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
             return failed;
@@ -156,8 +164,7 @@ velm_simulation::resolve(const std::string& path, bool follow, std::string& cano
             canonical = next;
         }
     }
-    failed.error = entry.kind == velm_entry::absent ? ENOENT : ENOTDIR;
-    return directory_asked && entry.kind != velm_entry::directory ? failed : entry;
+    return entry;
 }
 
 velm_entry

@@ -266,6 +266,72 @@ find_system_version(finder& f)
     found.tries = {write};
 }
 
+// Repairs that end on other data the device holds, the newest first:
+// tz_latest pointed at an update named by a version that holds a tz
+// database (or removed, for the system data), and zoneinfo removed, so that
+// the boot links the system data and adopts what tz_latest names.
+std::vector<velm_commands>
+data_moves(finder& f)
+{
+    velm_simulation& tree = f.now();
+    std::vector<std::pair<velm_version, std::string>> found;
+    std::string updates = tree.where(velm_path::updates, true);
+    for (const auto& [name, entry_kind] : tree.names(updates).value_or(velm_names())) {
+        velm_version version;
+        std::string root = velm_path::updates + name;
+        if (entry_kind != velm_entry::directory || velm_version_match_text(name).size != 5 ||
+            kind(tree, root + "/zoneinfo", true) != velm_entry::directory)
+            continue;
+        try {
+            velm_version_parse(version, name);
+            found.emplace_back(version, root);
+        } catch (...) {
+            // A number beyond 32 bits: no dataset the boot can build.
+        }
+    }
+    std::sort(found.begin(), found.end(),
+              [](const auto& a, const auto& b) { return a.first > b.first; });
+    found.resize(std::min(found.size(), size_t(4)));
+    std::vector<velm_commands> bases;
+    for (const auto& [version, root] : found) {
+        bases.push_back(clear(velm_path::zoneinfo_link));
+        bases.back().insert(bases.back().begin(), ln(root, velm_path::latest_link));
+    }
+    bases.push_back(clear(velm_path::latest_link));
+    for (const velm_command& command : clear(velm_path::zoneinfo_link))
+        bases.back().push_back(command);
+    // Each with the device's zone kept, and with what it leaves unnamed
+    // pruned, so that one round ends it.
+    std::string live = std::string(velm_path::zoneinfo_link) + "/" + f.r.zone;
+    bool zone = !f.r.zone.empty() && (f.r.localtime_zone != f.r.zone ||
+                                      !velm_zone_file(tree, velm_path::localtime_link));
+    std::vector<velm_commands> moves;
+    for (const velm_commands& base : bases) {
+        for (int variant = 0; variant < (zone ? 4 : 2); ++variant) {
+            moves.push_back(base);
+            if (variant >= 2)
+                for (const velm_command& command : relink(live, velm_path::localtime_link))
+                    moves.back().push_back(command);
+            // icutz still names the update left, until the boot relinks it.
+            if (variant % 2 == 1)
+                for (const velm_command& command : clear(velm_path::icutz_link))
+                    moves.back().push_back(command);
+            if (variant % 2 == 1)
+                moves.back().push_back({velm_command::prune, "", ""});
+        }
+    }
+    return moves;
+}
+
+// A finding's tries, and then the repairs that end on other data.
+std::vector<velm_commands>
+with_moves(finder& f, std::vector<velm_commands> tries)
+{
+    for (velm_commands& move : data_moves(f))
+        tries.push_back(move);
+    return tries;
+}
+
 // The data in use, as the zoneinfo link names it.
 void
 find_live(finder& f)
@@ -280,14 +346,14 @@ find_live(finder& f)
               std::string(velm_path::zoneinfo_link) + " " +
                   standing(tree, velm_path::zoneinfo_link) +
                   ", which leads to no tz database: programs have none; " + consequence + ".")
-            .tries = {{}, reset, system};
+            .tries = with_moves(f, {{}, reset, system});
     } else if (!r.next_boot.understood) {
         f.add("warning", "zoneinfo-not-understood", velm_path::zoneinfo_link,
               std::string(velm_path::zoneinfo_link) + " " +
                   standing(tree, velm_path::zoneinfo_link) + ", which is neither an update below " +
                   velm_path::updates + " nor " + velm_path::system_zoneinfo + ": " + consequence +
                   ".")
-            .tries = {{}, reset, system};
+            .tries = with_moves(f, {{}, reset, system});
     }
     if (!r.next_boot.current.present || r.next_boot.kept)
         return;
@@ -305,7 +371,7 @@ find_live(finder& f)
     f.add("warning", "live-rejected", velm_path::zoneinfo_link,
           "The data in use, " + (r.live.present ? r.live.version : r.live.root) + ", " + why +
               ": the next boot sets it aside and " + what_it_does(r.next_boot) + ".")
-        .tries = {{}, {rm(velm_path::latest_link)}};
+        .tries = with_moves(f, {{}, {rm(velm_path::latest_link)}});
 }
 
 // A tz_latest the boot tool does not understand: why, and what it does.
@@ -326,11 +392,13 @@ latest_not_understood(finder& f, const velm_entry& entry)
                   (f.r.next_boot.abandoned ? "gives up its choice and links the system data"
                                            : what_it_does(f.r.next_boot)) +
                   ".");
+    // Another spelling of an update's directory (relative, "//", "/./",
+    // "/../"): the same update, spelled as the boot reads it.
     std::string meant = velm_update_at(tree, velm_path::latest_link);
-    if (entry.kind == velm_entry::link && !has_prefix(target, "/") && !meant.empty() &&
+    if (entry.kind == velm_entry::link && !meant.empty() &&
         tree.where(meant, true) == tree.where(velm_path::latest_link, true))
         found.tries.push_back({ln(meant, velm_path::latest_link)});
-    found.tries.push_back({rm(velm_path::latest_link)});
+    found.tries = with_moves(f, found.tries);
 }
 
 // An update refused by the next boot, or adopted and set aside by the one
@@ -346,16 +414,22 @@ latest_refused(finder& f, const velm_refusal& refusal)
     velm_commands to_live = r.live.present && !r.live.root.empty()
                                 ? velm_commands{ln(r.live.root, velm_path::latest_link)}
                                 : unlink;
+    // The update it leads to, spelled as the boot reads it, when that is
+    // not how tz_latest spells it (".../tz/./2024a.1.0").
+    std::string meant = velm_update_at(tree, velm_path::latest_link);
+    velm_commands respelled = {ln(meant, velm_path::latest_link)};
+    if (meant.empty() || meant == target ||
+        tree.where(meant, true) != tree.where(velm_path::latest_link, true))
+        respelled.clear();
     if (target.back() == '/') {
         f.add("warning", "latest-trailing-slash", latest.root,
               "tz_latest names \"" + target + "\", with a trailing slash: its version is then \"" +
                   latest.version + "\", which is not a version, and no boot adopts it.")
-            .tries = {
-            {ln(target.substr(0, target.find_last_not_of('/') + 1), velm_path::latest_link)}};
+            .tries = with_moves(f, {respelled});
     } else if (kind(tree, latest.root, true) != velm_entry::directory) {
         f.add("warning", "latest-missing", latest.root,
               "tz_latest names " + latest.root + ", which does not exist: no boot adopts it.")
-            .tries = {to_live, unlink};
+            .tries = with_moves(f, {to_live, unlink});
     } else if (!latest.version_understood) {
         velm_finding& found =
             f.add("warning", "latest-not-a-version", latest.root,
@@ -364,10 +438,13 @@ latest_refused(finder& f, const velm_refusal& refusal)
         std::string version = velm_release_version(word.empty() ? "2025b" : word);
         std::string renamed = velm_path::updates + version;
         found.manual = "a version as the name of " + latest.root + ", such as " + version;
+        if (!respelled.empty())
+            found.tries.push_back(respelled);
         if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
             kind(tree, renamed) == velm_entry::absent)
-            found.tries = {{{velm_command::move_tree, latest.root, renamed},
-                            ln(renamed, velm_path::latest_link)}};
+            found.tries.push_back({{velm_command::move_tree, latest.root, renamed},
+                                   ln(renamed, velm_path::latest_link)});
+        found.tries = with_moves(f, found.tries);
     } else {
         velm_finding& found =
             f.add("warning", refusal.id.c_str(), latest.root,
@@ -383,9 +460,11 @@ latest_refused(finder& f, const velm_refusal& refusal)
                                         : "ICU data built for schema " + want + ", as " +
                                               latest.root + "/icutz/icutz" + want +
                                               ".dat, a regular file readable by others";
-        else
-            found.tries = latest.older ? std::vector<velm_commands>{unlink}
-                                       : std::vector<velm_commands>{to_live, unlink};
+        // Back to the data in use, or on to other data the device holds:
+        // every boot then stops saying it.
+        found.tries = latest.older ? std::vector<velm_commands>{unlink}
+                                   : std::vector<velm_commands>{to_live, unlink};
+        found.tries = with_moves(f, found.tries);
     }
 }
 
@@ -476,6 +555,33 @@ unreadable_by_others(velm_simulation& tree, const std::string& path, int depth,
     }
 }
 
+// An update the links name that cannot serve the device: without the
+// device's zone (in use, or once adopted, the device loses it); or, in use
+// and kept by every boot, without its tz database or its ICU data. The
+// repair ends on other data: back to what the device used, or on.
+void
+find_incomplete(finder& f, const std::string& root)
+{
+    const velm_report& r = f.r;
+    velm_simulation& tree = f.now();
+    bool zoneinfo = kind(tree, root + "/zoneinfo", true) == velm_entry::directory;
+    std::string data = velm_icu_file(tree, root + "/icutz");
+    bool kept = update_of(r.next_boot.zoneinfo) == root && r.after_next &&
+                update_of(r.after_next->zoneinfo) == root;
+    if (kept && (!zoneinfo || data.empty()))
+        f.add("error", "update-incomplete", root,
+              root + ", which every boot keeps, has " +
+                  (!zoneinfo ? "no tz database (zoneinfo/)" : "no ICU data the boot can use") +
+                  ": it was copied in part.")
+            .tries = with_moves(f, {});
+    if (zoneinfo && !r.zone.empty() && !velm_zone_file(tree, root + "/zoneinfo/" + r.zone))
+        f.add("warning", "update-lacks-zone", root,
+              root + "/zoneinfo lacks " + r.zone + ", the device's zone: " +
+                  (update_of(r.zoneinfo) == root ? "programs have no zone but UTC."
+                                                 : "once it is in use, programs have none."))
+            .tries = with_moves(f, {{}});
+}
+
 // What is wrong inside the updates the links name, now or after the next
 // boot.
 void
@@ -511,6 +617,7 @@ find_updates(finder& f)
                       ": the boot goes by its name alone and uses it, and ICU's readers then "
                       "fail.")
                 .manual = "ICU data built by ICU's tools as " + data;
+        find_incomplete(f, root);
         std::vector<std::string> unreadable;
         unreadable_by_others(tree, root, 0, unreadable);
         if (!unreadable.empty())
@@ -520,6 +627,42 @@ find_updates(finder& f)
                       "or its ICU data are missing.")
                 .manual = "read access for others to " + root + " (chmod -R a+rX " + root + ")";
     }
+}
+
+// The icutz link as the next boot leaves it, beside the data in use. A
+// legacy /var/db/icutz that resolves goes with it, or the next boot
+// migrates it back.
+void
+find_icutz(finder& f)
+{
+    const velm_run& next = f.r.next_boot;
+    std::string update = update_of(next.zoneinfo);
+    velm_commands unlink = {rm(velm_path::icutz_link)};
+    if (kind(f.now(), velm_path::legacy_icu_link, true) != velm_entry::absent)
+        unlink.push_back(rm(velm_path::legacy_icu_link));
+    velm_simulation& tree = f.next();
+    velm_entry icutz = tree.look(velm_path::icutz_link);
+    bool leads = kind(tree, velm_path::icutz_link, true) == velm_entry::directory;
+    if (icutz.kind == velm_entry::link && !leads)
+        f.add("warning", "icutz-unusable", velm_path::icutz_link,
+              "icutz names " + quoted(next.icutz) +
+                  ", which loops or leads to no directory: ICU's readers find no data there, "
+                  "and no boot changes that.")
+            .tries = {update.empty() ? unlink : relink(update + "/icutz", velm_path::icutz_link)};
+    else if (!update.empty() && next.icutz != update + "/icutz")
+        f.add("warning", icutz.kind != velm_entry::absent ? "icutz-stale" : "icutz-missing",
+              velm_path::icutz_link,
+              "icutz names " + quoted(next.icutz) + ", not the ICU data of the update in use, " +
+                  update +
+                  ": ICU's readers use other data than the tz database, and no boot "
+                  "changes that.")
+            .tries = {relink(update + "/icutz", velm_path::icutz_link)};
+    else if (update.empty() && icutz.kind != velm_entry::absent &&
+             tree.where(velm_path::icutz_link, true) != tree.where(velm_path::system_icu, true))
+        f.add("warning", "icutz-with-system", velm_path::icutz_link,
+              "icutz is there while the system data is in use: ICU's readers use data that is "
+              "not the system's, and no boot changes that.")
+            .tries = {unlink};
 }
 
 // The next boot, and the links it leaves.
@@ -560,43 +703,64 @@ find_next_boot(finder& f)
         f.add("error", "next-boot-unusable", velm_path::zoneinfo_link,
               "The next boot links zoneinfo to " + quoted(next.zoneinfo) +
                   ", where there is no tz database: programs would fall back to UTC.")
-            .tries = {{rm(velm_path::latest_link)}, system};
-    std::string update = update_of(next.zoneinfo);
-    bool icutz = kind(f.next(), velm_path::icutz_link) != velm_entry::absent;
-    if (!update.empty() && next.icutz != update + "/icutz")
-        f.add("warning", icutz ? "icutz-stale" : "icutz-missing", velm_path::icutz_link,
-              "icutz names " + quoted(next.icutz) + ", not the ICU data of the update in use, " +
-                  update +
-                  ": ICU's readers use other data than the tz database, and no boot "
-                  "changes that.")
-            .tries = {relink(update + "/icutz", velm_path::icutz_link)};
-    else if (update.empty() && icutz)
-        f.add("warning", "icutz-with-system", velm_path::icutz_link,
-              "icutz is there while the system data is in use: ICU's readers use data that is "
-              "not the system's, and no boot changes that.")
-            .tries = {{rm(velm_path::icutz_link)}};
+            .tries = with_moves(f, {{rm(velm_path::latest_link)}, system});
+    find_icutz(f);
     (void)tree;
 }
 
-// The zone a localtime link means, wherever its target lies: what follows
-// the live tree, the system's tree or an update's tree in it.
+// A path with "." and ".." taken out, as a name: what a link spells, not
+// where the kernel would lead, which is all a zone's name needs.
 std::string
-zone_meant(velm_simulation& tree, const velm_text& target)
+normalized(const std::string& path)
 {
-    if (!target)
-        return "";
-    std::string at =
-        has_prefix(*target, "/") ? *target : std::string(velm_path::link_directory) + "/" + *target;
-    for (const std::string& tree_of : {std::string(velm_path::zoneinfo_link),
-                                       std::string(velm_path::legacy_zoneinfo) + ".default",
-                                       std::string(velm_path::legacy_zoneinfo)}) {
-        if (has_prefix(at, (tree_of + "/").c_str()))
-            return at.substr(tree_of.size() + 1);
+    std::vector<std::string> names;
+    for (size_t at = 0; at < path.size();) {
+        size_t end = std::min(path.find('/', at), path.size());
+        std::string name = path.substr(at, end - at);
+        if (name == ".." && !names.empty())
+            names.pop_back();
+        else if (!name.empty() && name != "." && name != "..")
+            names.push_back(name);
+        at = end + 1;
     }
-    std::string real = tree.where(at);
-    std::string update = velm_update_of(real);
-    std::string top = update.empty() ? velm_path::system_zoneinfo : update + "/zoneinfo";
-    return has_prefix(real, (top + "/").c_str()) ? real.substr(top.size() + 1) : "";
+    std::string out;
+    for (const std::string& name : names)
+        out += "/" + name;
+    return out;
+}
+
+// The zone a link names, in any spelling (absolute, relative, through
+// /usr/share/zoneinfo): the part of its target after a tz database's
+// directory, the live one, the system's, /usr/share/zoneinfo or an
+// update's; or else, link after link, of the first target that has one.
+std::string
+zone_named(velm_simulation& tree, std::string at)
+{
+    for (int hops = 0; hops < 40; ++hops) {
+        velm_entry entry = tree.look(at);
+        if (entry.kind != velm_entry::link || entry.text.empty())
+            return "";
+        at = normalized(entry.text[0] == '/' ? entry.text : parent_of(at) + "/" + entry.text);
+        std::vector<std::string> tops = {velm_path::zoneinfo_link, velm_path::system_zoneinfo,
+                                         velm_path::legacy_zoneinfo};
+        if (!velm_update_of(at).empty())
+            tops.push_back(velm_update_of(at) + "/zoneinfo");
+        for (const std::string& top : tops) {
+            if (has_prefix(at, (top + "/").c_str()))
+                return at.substr(top.size() + 1);
+        }
+    }
+    return "";
+}
+
+// The zone the device's programs use: the one /etc/localtime leads to,
+// through localtime or not; where there is no /etc/localtime, the one
+// localtime names.
+std::string
+device_zone(velm_simulation& tree)
+{
+    bool etc = kind(tree, velm_path::etc_localtime) != velm_entry::absent;
+    return zone_named(tree, etc ? velm_path::etc_localtime : velm_path::localtime_link);
 }
 
 void
@@ -605,7 +769,7 @@ find_localtime(finder& f)
     const velm_report& r = f.r;
     const velm_run& next = r.next_boot;
     bool usable_now = velm_zone_file(f.now(), velm_path::localtime_link);
-    std::string zone = zone_meant(f.now(), r.localtime);
+    const std::string& zone = r.zone;
     bool usable_next = velm_zone_file(f.next(), velm_path::localtime_link);
     std::string live = std::string(velm_path::zoneinfo_link) + "/";
     velm_commands to_zone = relink(live + zone, velm_path::localtime_link);
@@ -663,13 +827,29 @@ find_etc_localtime(finder& f)
     }
     if (through)
         return;
+    // The zone it names is the one set (by timedatectl, say): kept when
+    // the data in use holds it, by pointing localtime at it too.
     bool missing = kind(tree, velm_path::etc_localtime) == velm_entry::absent;
+    const std::string& zone = f.r.zone;
+    std::string live = std::string(velm_path::zoneinfo_link) + "/";
+    bool other = !zone.empty() && zone != zone_named(tree, velm_path::localtime_link);
+    bool held = other && velm_zone_file(f.next(), live + zone);
+    velm_commands repair = relink(velm_path::localtime_link, velm_path::etc_localtime);
+    if (held)
+        repair.insert(repair.begin(), ln(live + zone, velm_path::localtime_link));
+    if (held && kind(tree, velm_path::localtime_link) == velm_entry::directory)
+        repair.insert(repair.begin(), rm(velm_path::localtime_link));
     f.add("warning", "etc-localtime", velm_path::etc_localtime,
           std::string(velm_path::etc_localtime) +
               (missing ? " is missing: programs use UTC, not the device's zone."
+               : held  ? " names " + zone + ", but does not lead through " +
+                            velm_path::localtime_link + ": the repair keeps that zone."
+               : other ? " names " + zone + ", which the data in use lacks, and does not lead " +
+                             "through " + velm_path::localtime_link + ": the repair loses " + zone +
+                             "."
                        : " does not lead through " + std::string(velm_path::localtime_link) +
                              ": programs use another zone than the device's."))
-        .tries = {relink(velm_path::localtime_link, velm_path::etc_localtime)};
+        .tries = {repair};
 }
 
 void
@@ -720,16 +900,18 @@ find_problems(velm_simulation& tree, velm_report& r)
     std::map<std::string, int> unread = tree.unread();
     finder f{tree, r};
     before_repair = &f.now();
+    r.zone = device_zone(f.now());
     find_places(f);
     find_unread(f, unread);
     find_system_version(f);
     find_live(f);
     find_latest(f);
-    find_unnamed(f);
     find_updates(f);
     find_next_boot(f);
     find_localtime(f);
     find_etc_localtime(f);
     find_record(f);
     find_legacy(f);
+    // Last: what to prune depends on the data the repairs above choose.
+    find_unnamed(f);
 }

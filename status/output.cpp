@@ -81,7 +81,8 @@ repair(const velm_finding& f, const std::string& root)
     if (!f.commands)
         return f.manual.empty() ? "Repair: none needed." : "Needs: " + shown(f.manual) + ".";
     if (f.commands->empty())
-        return "Repair: nothing to run; the next boot does it.";
+        return f.by_earlier ? "Repair: nothing more to run; the commands above, then one boot, do it."
+                            : "Repair: nothing to run; the next boot does it.";
     std::string out = f.verified ? "Repair:" : "Repair (not shown to work):";
     for (const velm_command& command : *f.commands)
         out += "\n      " + shown(shell_text(command, root));

@@ -95,9 +95,7 @@ note_unread(const std::map<std::string, int>& unread, velm_report& r)
     r.record_unreadable = below(velm_path::record);
 }
 
-// The whole report of the tree as the simulation stands, but for the
-// commands' check; the simulation is left as it was found.
-static velm_report
+velm_report
 survey(velm_simulation& tree, const std::string& root)
 {
     velm_report r;
@@ -122,100 +120,6 @@ survey(velm_simulation& tree, const std::string& root)
             r.health = "degraded";
     }
     return r;
-}
-
-static bool
-same(const velm_finding& a, const velm_finding& b)
-{
-    return a.id == b.id && a.subject == b.subject;
-}
-
-// The device after commands and one boot, as the report of it would say.
-// The device after commands and one boot, as the report of it would say;
-// none when a command fails, which stops a script run with sh -e.
-static std::optional<velm_report>
-repaired(velm_simulation& tree, const velm_commands& commands)
-{
-    for (const velm_command& command : commands) {
-        if (!apply(tree, command))
-            return std::nullopt;
-    }
-    simulate_boot(tree);
-    return survey(tree, "");
-}
-
-// Whether the report after a repair has none of the findings it was to
-// clear, and no error that was not there before.
-static bool
-cleared(const velm_report& before, const std::vector<const velm_finding*>& targets,
-        const std::optional<velm_report>& after)
-{
-    if (!after)
-        return false;
-    for (const velm_finding& found : after->findings) {
-        for (const velm_finding* target : targets) {
-            if (same(found, *target))
-                return false;
-        }
-        bool known = false;
-        for (const velm_finding& old : before.findings)
-            known = known || same(found, old);
-        if (found.severity == "error" && !known)
-            return false;
-    }
-    return true;
-}
-
-// Each finding's commands are checked before they are shown: applied to the
-// simulation, followed by a simulated boot, they must clear the finding and
-// break nothing. Then all of them together, in the report's order.
-static void
-check_repairs(velm_simulation& tree, velm_report& r)
-{
-    velm_simulation::changes now = tree.checkpoint();
-    velm_commands all;
-    std::vector<const velm_finding*> targets;
-    for (velm_finding& finding : r.findings) {
-        // A finding that follows from one before it is cleared by that
-        // one's repair, perhaps with its own; or by all of theirs.
-        std::vector<velm_commands> tries = finding.tries, earlier;
-        for (const velm_finding* target : targets)
-            earlier.push_back(*target->commands);
-        if (targets.size() > 1)
-            earlier.push_back(all);
-        for (const velm_commands& first : earlier) {
-            for (const velm_commands& own : finding.tries) {
-                tries.push_back(first);
-                tries.back().insert(tries.back().end(), own.begin(), own.end());
-            }
-        }
-        for (const velm_commands& commands : tries) {
-            bool works = cleared(r, {&finding}, repaired(tree, commands));
-            tree.rewind(now);
-            if (works) {
-                finding.commands = commands, finding.verified = true;
-                break;
-            }
-        }
-        // None that works, and nothing to supply: a fault of this program,
-        // shown as such.
-        if (!finding.commands && finding.manual.empty() && !finding.tries.empty())
-            finding.commands = finding.tries.front();
-        if (finding.commands)
-            finding.manual.clear();
-        if (!finding.commands)
-            continue;
-        all.insert(all.end(), finding.commands->begin(), finding.commands->end());
-        targets.push_back(&finding);
-    }
-    std::optional<velm_report> after = repaired(tree, all);
-    tree.rewind(now);
-    bool together = cleared(r, targets, after);
-    for (velm_finding& finding : r.findings)
-        finding.verified = finding.verified && together;
-    r.repaired_health = after ? after->health : "unknown";
-    for (const velm_finding& finding : after ? after->findings : r.findings)
-        r.repaired_findings.push_back(finding.id);
 }
 
 velm_report

@@ -23,9 +23,10 @@ struct velm_finding {
     std::string manual;
     std::string subject;   // the path it is about: with the id, what tells two apart
     bool verified = false; // the commands, simulated, clear it and break nothing
-    // Repairs to try, in order: the first that the simulation shows to work
-    // becomes commands; when none does, manual (or the first, unverified).
+    // Repairs to try: the one whose outcome the simulation shows best
+    // becomes commands; when none works, manual (or the first, unverified).
     std::vector<velm_commands> tries;
+    bool by_earlier = false; // nothing more to run, once the commands above have run
 };
 
 struct velm_report {
@@ -35,6 +36,7 @@ struct velm_report {
     bool system_missing = false;      // no directory of system data to fall back on
     bool zoneinfo_understood = false; // names an update's or the system's tz database
     std::string localtime_zone;       // what follows the live tree's prefix, if anything
+    std::string zone;                 // the zone the device's programs use, by its name
     velm_dataset_facts live, system, latest;
     velm_run next_boot;
     std::optional<velm_run> after_next; // the boot after it, when the next one succeeds
@@ -51,8 +53,13 @@ struct velm_report {
 // left as it was found. root is how commands name the tree.
 velm_report make_report(velm_simulation& tree, const velm_device& device);
 
-// The findings of a report, for a report of a tree changed in the simulation.
+// The whole report of the tree as the simulation stands, but for the
+// repairs' search; the simulation is left as it was found.
+velm_report survey(velm_simulation& tree, const std::string& root);
+// Its findings, for a report of a tree changed in the simulation.
 void find_problems(velm_simulation& tree, velm_report& r);
+// The repairs of the report's findings, checked on the simulation.
+void check_repairs(velm_simulation& tree, velm_report& r);
 
 // The version of the JSON report's contract (docs/status.schema.json):
 // raised whenever a change could break a reader of the one before.
