@@ -46,9 +46,9 @@ read_first_word(const std::string& path, std::string& target, size_t keep)
     // is what errno says in the messages that follow.
     struct stat st;
     std::string word;
-    int error = fstat(fd, &st) != 0 ? errno
+    int error = fstat(fd, &st) != 0                          ? errno
                 : S_ISREG(st.st_mode) || S_ISDIR(st.st_mode) ? first_word_of(fd, word, keep)
-                                                              : 0;
+                                                             : 0;
     if (error != 0 && error != EISDIR)
         system_calls().io_failed(path, error);
     (void)close(fd);

@@ -57,8 +57,7 @@ facts_of(const velm_dataset& dataset)
     facts.root = dataset.get_root();
     facts.version = dataset.get_version_string();
     facts.version_understood = dataset.get_version().year >= 0;
-    facts.icu_schema =
-        dynamic_cast<const velm_icu&>(*dataset.get_components().at(1)).get_schema();
+    facts.icu_schema = dynamic_cast<const velm_icu&>(*dataset.get_components().at(1)).get_schema();
     return facts;
 }
 
@@ -77,8 +76,8 @@ class velm_reasons final : public velm_startup_watcher {
         run.current = facts_of(current);
         run.current.compatible = compatible, run.current.older = older;
     }
-    void latest(const velm_dataset& latest, const velm_dataset& system, bool compatible,
-                bool newer, bool adopted) override
+    void latest(const velm_dataset& latest, const velm_dataset& system, bool compatible, bool newer,
+                bool adopted) override
     {
         run.adopted = adopted;
         run.latest = facts_of(latest);
@@ -104,8 +103,7 @@ refusal_of(const velm_run& next, const velm_run* after)
     if (!latest.compatible && latest.icu_schema.empty())
         return velm_refusal{"latest-no-icu",
                             "which has no ICU data the boot can use (a regular file " +
-                                latest.root + "/icutz/icutz" + want +
-                                ".dat, readable by others)"};
+                                latest.root + "/icutz/icutz" + want + ".dat, readable by others)"};
     if (!latest.compatible)
         return velm_refusal{"latest-other-schema", "whose ICU data has schema " +
                                                        latest.icu_schema + "; the system's is " +

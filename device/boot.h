@@ -42,7 +42,7 @@ struct velm_run {
     bool understood = true;
     velm_dataset_facts system, current, latest;
     bool kept = false, adopted = false; // the current dataset; the latest
-    bool abandoned = false; // a failure ended the decision: reset to the system data
+    bool abandoned = false;             // a failure ended the decision: reset to the system data
     // The changes the tree refused the run, in order: path and error.
     std::vector<std::pair<std::string, int>> refused;
 };

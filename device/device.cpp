@@ -30,7 +30,7 @@ velm_device::open_directory(const std::string& path, std::string* real) const
     std::string canonical;
     velm_entry entry = tree.look(path, true, &canonical);
     if (entry.kind != velm_entry::directory) {
-        errno = entry.error != 0 ? entry.error
+        errno = entry.error != 0                   ? entry.error
                 : entry.kind == velm_entry::absent ? ENOENT
                                                    : ENOTDIR;
         return -1;

@@ -439,7 +439,7 @@ velm_simulation::readlink(const char* path, char* buffer, size_t size)
     int saved = errno;
     velm_entry entry = look(path);
     if (entry.error != 0 || entry.kind != velm_entry::link)
-        return fail(entry.error != 0                        ? entry.error
+        return fail(entry.error != 0                   ? entry.error
                     : entry.kind == velm_entry::absent ? ENOENT
                                                        : EINVAL);
     size_t n = entry.text.copy(buffer, size);

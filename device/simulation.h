@@ -49,8 +49,7 @@ class velm_simulation final : public velm_system_calls {
 
     // The entry at path, its last component not followed (or followed);
     // with where it leads inside the root, when canonical is given.
-    velm_entry look(const std::string& path, bool follow = false,
-                    std::string* canonical = nullptr);
+    velm_entry look(const std::string& path, bool follow = false, std::string* canonical = nullptr);
     // The entry at a canonical path (as look gives it), nothing followed:
     // for the names of a directory already resolved, the quickest look.
     velm_entry at(const std::string& canonical) { return entry_at(canonical); }

@@ -43,4 +43,3 @@ text_run(const velm_run& next)
         out += "  It exits with status " + std::to_string(next.exit_status) + ".\n";
     return out;
 }
-

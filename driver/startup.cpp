@@ -76,8 +76,7 @@ decide(velm_startup_watcher* watcher)
         write_version_diff_record(in_use->get_version_string(), latest.get_version_string());
     } else {
         warn("New update not compatible or older version: %s vs. %s",
-             latest.get_version_string().c_str(),
-             current.get_version_string().c_str());
+             latest.get_version_string().c_str(), current.get_version_string().c_str());
     }
 }
 

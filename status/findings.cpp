@@ -11,8 +11,8 @@
 #include "support/version.h"
 
 #include <algorithm>
-#include <set>
 #include <cstring>
+#include <set>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -250,7 +250,7 @@ find_system_version(finder& f)
                         "be linked.")
             : f.add("warning", "system-version", version,
                     (velm_first_word(tree, version).empty() ? version + " holds no version, so t"
-                                                       : std::string("T")) +
+                                                            : std::string("T")) +
                         "he system data's version is \"" + f.r.system.version +
                         "\", which is not a version: every boot warns about it, the system data "
                         "orders below every update, and the data in use is never found older "
@@ -323,6 +323,18 @@ data_moves(finder& f)
     return moves;
 }
 
+// Tries, each also followed by a prune of what it leaves unnamed (the
+// update tz_latest named, once refused), so that one round ends it.
+std::vector<velm_commands>
+with_prune(std::vector<velm_commands> tries)
+{
+    for (size_t i = 0, n = tries.size(); i < n; ++i) {
+        tries.push_back(tries[i]);
+        tries.back().push_back({velm_command::prune, "", ""});
+    }
+    return tries;
+}
+
 // A finding's tries, and then the repairs that end on other data.
 std::vector<velm_commands>
 with_moves(finder& f, std::vector<velm_commands> tries)
@@ -382,7 +394,8 @@ latest_not_understood(finder& f, const velm_entry& entry)
     std::string target = f.r.tz_latest.value_or("");
     std::string why =
         entry.kind != velm_entry::link ? "is no link"
-        : !has_prefix(target, "/") ? "names \"" + target + "\": a relative target is never understood"
+        : !has_prefix(target, "/")
+            ? "names \"" + target + "\": a relative target is never understood"
         : !has_prefix(target, velm_path::updates) || velm_update_of(target).empty()
             ? "names \"" + target + "\", which is no update below " + velm_path::updates
             : "names " + target + ", whose version holds a number too large";
@@ -429,7 +442,7 @@ latest_refused(finder& f, const velm_refusal& refusal)
     } else if (kind(tree, latest.root, true) != velm_entry::directory) {
         f.add("warning", "latest-missing", latest.root,
               "tz_latest names " + latest.root + ", which does not exist: no boot adopts it.")
-            .tries = with_moves(f, {to_live, unlink});
+            .tries = with_moves(f, with_prune({to_live, unlink}));
     } else if (!latest.version_understood) {
         velm_finding& found =
             f.add("warning", "latest-not-a-version", latest.root,
@@ -454,17 +467,18 @@ latest_refused(finder& f, const velm_refusal& refusal)
                                               "older still, and the boot after sets it aside."));
         std::string want = r.system.icu_schema;
         if (!latest.compatible)
-            found.manual = want.empty() ? "the system's ICU schema, such as 44l, as the first word "
-                                          "of " + std::string(velm_path::system_icu) +
-                                              "/icutzformat.txt"
-                                        : "ICU data built for schema " + want + ", as " +
-                                              latest.root + "/icutz/icutz" + want +
-                                              ".dat, a regular file readable by others";
+            found.manual = want.empty()
+                               ? "the system's ICU schema, such as 44l, as the first word "
+                                 "of " +
+                                     std::string(velm_path::system_icu) + "/icutzformat.txt"
+                               : "ICU data built for schema " + want + ", as " + latest.root +
+                                     "/icutz/icutz" + want +
+                                     ".dat, a regular file readable by others";
         // Back to the data in use, or on to other data the device holds:
         // every boot then stops saying it.
         found.tries = latest.older ? std::vector<velm_commands>{unlink}
                                    : std::vector<velm_commands>{to_live, unlink};
-        found.tries = with_moves(f, found.tries);
+        found.tries = with_moves(f, with_prune(found.tries));
     }
 }
 
@@ -519,8 +533,10 @@ find_unnamed(finder& f)
     if (kind(tree, links + ".tz_latest.new") != velm_entry::absent)
         leftovers.push_back(links + ".tz_latest.new");
     velm_commands prune = {{velm_command::prune, "", ""}};
+    // Named by the first of them: a later note about others, such as the
+    // update a boot's adoption replaces, is another finding.
     if (!unnamed.empty())
-        f.add("note", "update-unnamed", velm_path::updates,
+        f.add("note", "update-unnamed", unnamed.front(),
               some_of(unnamed) + (unnamed.size() == 1 ? " is an update" : " are updates") +
                   " that no link names: nothing uses " + (unnamed.size() == 1 ? "it." : "them."))
             .tries = {prune};
@@ -574,12 +590,17 @@ find_incomplete(finder& f, const std::string& root)
                   (!zoneinfo ? "no tz database (zoneinfo/)" : "no ICU data the boot can use") +
                   ": it was copied in part.")
             .tries = with_moves(f, {});
-    if (zoneinfo && !r.zone.empty() && !velm_zone_file(tree, root + "/zoneinfo/" + r.zone))
-        f.add("warning", "update-lacks-zone", root,
-              root + "/zoneinfo lacks " + r.zone + ", the device's zone: " +
-                  (update_of(r.zoneinfo) == root ? "programs have no zone but UTC."
-                                                 : "once it is in use, programs have none."))
-            .tries = with_moves(f, {{}});
+    if (!zoneinfo || r.zone.empty() || velm_zone_file(tree, root + "/zoneinfo/" + r.zone))
+        return;
+    bool in_use = update_of(r.zoneinfo) == root;
+    velm_commands back = r.live.present && !r.live.root.empty() && !in_use
+                             ? velm_commands{ln(r.live.root, velm_path::latest_link)}
+                             : velm_commands{rm(velm_path::latest_link)};
+    f.add(
+         "warning", "update-lacks-zone", root,
+         root + "/zoneinfo lacks " + r.zone + ", the device's zone: " +
+             (in_use ? "programs have no zone but UTC." : "once it is in use, programs have none."))
+        .tries = with_moves(f, with_prune({{}, back}));
 }
 
 // What is wrong inside the updates the links name, now or after the next
@@ -677,17 +698,19 @@ find_next_boot(finder& f)
         // kernel, or else the last failure.
         std::string failed;
         int why = 0;
-        auto refusal = [](int error) { return error == EROFS || error == EACCES || error == EPERM; };
+        auto refusal = [](int error) {
+            return error == EROFS || error == EACCES || error == EPERM;
+        };
         for (const auto& [path, error] : next.refused) {
             if (!refusal(why))
                 failed = path, why = error;
         }
-        velm_finding& found =
-            f.add("error", "next-boot-fails", "",
-                  "The next boot cannot even link the system data" +
-                      (failed.empty() ? std::string() : " (" + failed + ": " + strerror(why) + ")") +
-                      ": it exits with status " + std::to_string(next.exit_status) +
-                      " and leaves localtime as it is.");
+        velm_finding& found = f.add(
+            "error", "next-boot-fails", "",
+            "The next boot cannot even link the system data" +
+                (failed.empty() ? std::string() : " (" + failed + ": " + strerror(why) + ")") +
+                ": it exits with status " + std::to_string(next.exit_status) +
+                " and leaves localtime as it is.");
         if (refusal(why))
             found.manual = "write access for root to " + parent_of(failed) +
                            (why == EROFS ? ", on a file system mounted read-write" : "");
@@ -844,11 +867,11 @@ find_etc_localtime(finder& f)
               (missing ? " is missing: programs use UTC, not the device's zone."
                : held  ? " names " + zone + ", but does not lead through " +
                             velm_path::localtime_link + ": the repair keeps that zone."
-               : other ? " names " + zone + ", which the data in use lacks, and does not lead " +
-                             "through " + velm_path::localtime_link + ": the repair loses " + zone +
-                             "."
-                       : " does not lead through " + std::string(velm_path::localtime_link) +
-                             ": programs use another zone than the device's."))
+               : other
+                   ? " names " + zone + ", which the data in use lacks, and does not lead " +
+                         "through " + velm_path::localtime_link + ": the repair loses " + zone + "."
+                   : " does not lead through " + std::string(velm_path::localtime_link) +
+                         ": programs use another zone than the device's."))
         .tries = {repair};
 }
 

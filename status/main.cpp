@@ -8,11 +8,16 @@
 
 #include <cstdio>
 #include <cstring>
+#include <err.h>
 #include <sysexits.h>
 
-static const option options[] = {flag("json"),  flag("commands"), maybe_valued("metrics"),
-                                  valued("root"), flag("help"),     flag("version"),
-                                  {}};
+static const option options[] = {flag("json"),
+                                 flag("commands"),
+                                 maybe_valued("metrics"),
+                                 valued("root"),
+                                 flag("help"),
+                                 flag("version"),
+                                 {}};
 static const char usage[] =
     "usage: tzlinks-status [--json | --commands | --metrics[=DIR]] [--root DIR]\n"
     "       tzlinks-status --help | --version\n";
@@ -42,6 +47,23 @@ form_of(int argc, char** argv, std::string& form)
         }
     }
     return 0;
+}
+
+// A script with nothing in it, where findings need what only a person can
+// supply, says so where the person looks, or an empty script passes for
+// a repair.
+static void
+needs_only(const std::string& form, const velm_report& report)
+{
+    size_t needs = 0, commands = 0;
+    for (const velm_finding& finding : report.findings) {
+        needs += !finding.manual.empty();
+        commands += finding.commands && !finding.commands->empty();
+    }
+    if (form == "commands" && commands == 0 && needs != 0)
+        warnx("no command to run: %zu finding%s need%s what only a person can supply (see "
+              "\"Needs:\" in the report)",
+              needs, needs == 1 ? "" : "s", needs == 1 ? "s" : "");
 }
 
 int
@@ -80,7 +102,9 @@ main(int argc, char** argv)
                                       : text_report(report))
                     .c_str(),
                 stdout);
-    if (form == "commands" || form == "metrics")
+    if (form == "commands" || form == "metrics") {
+        needs_only(form, report);
         return written(0);
+    }
     return written(report.health == "healthy" ? 0 : report.health == "degraded" ? 1 : 2);
 }

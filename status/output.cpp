@@ -53,16 +53,16 @@ json_report(const velm_report& r)
     std::string remaining;
     for (const std::string& id : r.repaired_findings)
         remaining += (remaining.empty() ? "" : ",") + json_text(id);
-    return "{\"format\":" + std::to_string(report_format) + ",\"zoneinfo\":" + json_text(r.zoneinfo) +
-           ",\"icutz\":" + json_text(r.icutz) + ",\"localtime\":" + json_text(r.localtime) +
-           ",\"tz_latest\":" + json_text(r.tz_latest) + ",\"record\":" + json_text(r.record) +
-           ",\"localtime_zone\":" +
+    return "{\"format\":" + std::to_string(report_format) +
+           ",\"zoneinfo\":" + json_text(r.zoneinfo) + ",\"icutz\":" + json_text(r.icutz) +
+           ",\"localtime\":" + json_text(r.localtime) + ",\"tz_latest\":" + json_text(r.tz_latest) +
+           ",\"record\":" + json_text(r.record) + ",\"localtime_zone\":" +
            json_text(r.localtime_zone.empty() ? velm_text() : r.localtime_zone) +
            ",\"live\":" + json(r.live, "live") + ",\"system\":" + json(r.system, "") +
            ",\"latest\":" + json(r.latest, "latest") + ",\"next_boot\":" + json_run(r.next_boot) +
-           ",\"findings\":" + json_findings(r.findings, r.root) + ",\"health\":" + json_text(r.health) +
-           R"(,"after_repair":{"health":)" + json_text(r.repaired_health) + ",\"findings\":[" +
-           remaining + "]}}\n";
+           ",\"findings\":" + json_findings(r.findings, r.root) +
+           ",\"health\":" + json_text(r.health) + R"(,"after_repair":{"health":)" +
+           json_text(r.repaired_health) + ",\"findings\":[" + remaining + "]}}\n";
 }
 
 static std::string
@@ -81,8 +81,9 @@ repair(const velm_finding& f, const std::string& root)
     if (!f.commands)
         return f.manual.empty() ? "Repair: none needed." : "Needs: " + shown(f.manual) + ".";
     if (f.commands->empty())
-        return f.by_earlier ? "Repair: nothing more to run; the commands above, then one boot, do it."
-                            : "Repair: nothing to run; the next boot does it.";
+        return f.by_earlier
+                   ? "Repair: nothing more to run; the commands above, then one boot, do it."
+                   : "Repair: nothing to run; the next boot does it.";
     std::string out = f.verified ? "Repair:" : "Repair (not shown to work):";
     for (const velm_command& command : *f.commands)
         out += "\n      " + shown(shell_text(command, root));
@@ -116,8 +117,8 @@ text_report(const velm_report& r)
                (r.latest.compatible ? "compatible with" : "incompatible with") +
                " the system data, " + (r.latest.newer ? "newer" : "not newer") +
                " than the data in use.\n";
-    out += text_link("zoneinfo", r.zoneinfo) + text_link("icutz", r.icutz) + text_link("localtime", r.localtime) +
-           text_link("tz_latest", r.tz_latest);
+    out += text_link("zoneinfo", r.zoneinfo) + text_link("icutz", r.icutz) +
+           text_link("localtime", r.localtime) + text_link("tz_latest", r.tz_latest);
     if (!r.localtime_zone.empty())
         out += "  The zone is " + shown(r.localtime_zone) + ".\n";
     out += r.record_unreadable ? "  The record of the last adoption cannot be read.\n"

@@ -9,6 +9,8 @@
 
 #include "support/version.h"
 
+#include <map>
+
 namespace {
 
 bool
@@ -83,7 +85,8 @@ outcome_of(const velm_report& before, const velm_report& after, const velm_comma
         velm_version_parse(o.data, after.live.version);
     o.commands = plan.size();
     for (const velm_command& command : plan)
-        o.removals += command.verb == velm_command::remove_tree || command.verb == velm_command::prune;
+        o.removals +=
+            command.verb == velm_command::remove_tree || command.verb == velm_command::prune;
     return o;
 }
 
@@ -105,9 +108,28 @@ better(const velm_outcome& a, const velm_outcome& b)
 
 } // namespace
 
+// The outcomes already simulated, by plan: findings after one that needs
+// nothing try the very plans it tried.
+struct velm_outcomes {
+    velm_simulation& tree;
+    std::map<std::string, std::optional<velm_report>> known;
+
+    const std::optional<velm_report>& of(const velm_commands& plan)
+    {
+        std::string key;
+        for (const velm_command& command : plan)
+            key += shell_text(command, "") + "\n";
+        auto found = known.find(key);
+        if (found == known.end())
+            found = known.emplace(key, repaired(tree, plan)).first;
+        return found->second;
+    }
+};
+
 void
 check_repairs(velm_simulation& tree, velm_report& r)
 {
+    velm_outcomes outcomes{tree, {}};
     velm_commands all;
     std::vector<const velm_finding*> targets;
     for (velm_finding& finding : r.findings) {
@@ -120,7 +142,7 @@ check_repairs(velm_simulation& tree, velm_report& r)
         for (const velm_commands& own : tries) {
             velm_commands plan = all;
             plan.insert(plan.end(), own.begin(), own.end());
-            std::optional<velm_report> after = repaired(tree, plan);
+            const std::optional<velm_report>& after = outcomes.of(plan);
             if (!after || !cleared(r, targets, *after))
                 continue;
             velm_outcome o = outcome_of(r, *after, plan);
@@ -131,7 +153,7 @@ check_repairs(velm_simulation& tree, velm_report& r)
         // Nothing more to run: by the next boot alone, or by the commands
         // of the findings above too.
         if (best && finding.commands->empty() && !all.empty()) {
-            std::optional<velm_report> alone = repaired(tree, {});
+            const std::optional<velm_report>& alone = outcomes.of({});
             finding.by_earlier = !alone || !cleared(r, {&finding}, *alone);
         }
         // None that works, and nothing to supply: a fault of this program,
@@ -145,7 +167,7 @@ check_repairs(velm_simulation& tree, velm_report& r)
         else
             targets.pop_back();
     }
-    std::optional<velm_report> after = repaired(tree, all);
+    const std::optional<velm_report>& after = outcomes.of(all);
     bool together = after && cleared(r, targets, *after);
     for (velm_finding& finding : r.findings)
         finding.verified = finding.verified && together;

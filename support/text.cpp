@@ -62,8 +62,8 @@ control(const std::string& text, size_t i, size_t n)
         return at(0) < 0x20 || at(0) == 0x7f;
     if (n == 2)
         return (at(0) == 0xc2 && at(1) < 0xa0) || (at(0) == 0xd8 && at(1) == 0x9c);
-    bool general = n == 3 && at(0) == 0xe2 && at(1) == 0x80, isolates = n == 3 && at(0) == 0xe2 &&
-                                                                          at(1) == 0x81;
+    bool general = n == 3 && at(0) == 0xe2 && at(1) == 0x80,
+         isolates = n == 3 && at(0) == 0xe2 && at(1) == 0x81;
     return (general && ((at(2) >= 0x8e && at(2) <= 0x8f) || (at(2) >= 0xa8 && at(2) <= 0xae))) ||
            (isolates && at(2) >= 0xa6 && at(2) <= 0xa9);
 }
@@ -116,4 +116,3 @@ json_text(const std::optional<std::string>& text)
 {
     return text ? json_text(*text) : "null";
 }
-

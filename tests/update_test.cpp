@@ -19,7 +19,6 @@ namespace {
 
 using nlohmann::json;
 
-
 std::string
 update(const std::string& args)
 {
@@ -79,7 +78,8 @@ try_update_faults(const std::string& args, const std::string& pristine, const st
     bool staging = args.compare(0, 5, "stage") == 0, checking = args.compare(0, 5, "check") == 0;
     int injected = 0, cuts = 0;
     for (const auto& [name, when, call] : calls_in(pristine + ".trace")) {
-        bool changes = std::regex_match(name, changing) || call.find("O_CREAT") != std::string::npos;
+        bool changes =
+            std::regex_match(name, changing) || call.find("O_CREAT") != std::string::npos;
         if (!changes && !std::regex_match(name, reading))
             continue;
         for (const char* how : {":error=EIO", ":signal=KILL"}) {
@@ -95,10 +95,12 @@ try_update_faults(const std::string& args, const std::string& pristine, const st
                 continue;
             }
             std::string latest = latest_of(state());
-            EXPECT_TRUE(latest == latest_was || latest == latest_of(done)) << inject << ": " << latest;
+            EXPECT_TRUE(latest == latest_was || latest == latest_of(done))
+                << inject << ": " << latest;
             if (staging && latest != latest_was) {
                 EXPECT_EQ(run("diff -r /var/tmp/src $(readlink /var/db/timezone/tz_latest)").status,
-                          0) << inject << ": a partial copy staged";
+                          0)
+                    << inject << ": a partial copy staged";
             }
             EXPECT_EQ(links(), was) << inject;
             EXPECT_EQ(errors(), errors_were) << inject;
@@ -205,7 +207,8 @@ TEST(update, command_line)
         {"check /var/tmp/src extra", "64 tzlinks-update: unknown argument: extra\n"},
         {"--version", "0 "},
         {"stage /var/tmp/src --wait 1", "75 tzlinks-update: /var/db/timezone/.tzlinks-update.lock "
-                                        "is held by process " + holder.substr(0, holder.size() - 1) +
+                                        "is held by process " +
+                                            holder.substr(0, holder.size() - 1) +
                                             ": gave up after 1 s\n"},
     };
     for (const auto& [args, expected] : uses) {
@@ -216,15 +219,17 @@ TEST(update, command_line)
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
     // Names are shown escaped.
     run("mkdir \"/var/db/timezone/tz/x$(printf '\\033[31m\\342\\200\\256\\nz')\"");
-    EXPECT_EQ(run(update("prune")).out, "Removed /var/db/timezone/tz/x\\x1b[31m\\xe2\\x80\\xae\\x0az\n");
+    EXPECT_EQ(run(update("prune")).out,
+              "Removed /var/db/timezone/tz/x\\x1b[31m\\xe2\\x80\\xae\\x0az\n");
     // A file system mounted inside an update no link names is left as it
     // is, and named; a full one is said to be full.
     run("mkdir -p /var/db/timezone/tz/old/zoneinfo && mount -t tmpfs m "
         "/var/db/timezone/tz/old/zoneinfo && touch /var/db/timezone/tz/old/zoneinfo/kept");
     outcome mounted = run(update("prune"));
-    EXPECT_EQ(std::to_string(mounted.status) + mounted.err,
-              "74tzlinks-update: cannot remove /var/db/timezone/tz/old/zoneinfo: Device or resource "
-              "busy\n");
+    EXPECT_EQ(
+        std::to_string(mounted.status) + mounted.err,
+        "74tzlinks-update: cannot remove /var/db/timezone/tz/old/zoneinfo: Device or resource "
+        "busy\n");
     EXPECT_EQ(run("ls /var/db/timezone/tz/old/zoneinfo").out, "kept\n");
     run("mount -t tmpfs -o size=4k full /var/db/timezone/tz");
     outcome full = run(update("stage /var/tmp/src --as 2025b.2.0"));
@@ -244,18 +249,21 @@ TEST(update, hostile_sources)
                            "2025b 44l"));
     // Made by descriptor: no shell can cd so deep.
     run("cd /dev/shm/deep/zoneinfo && exec python3 -c 'import os\nfd = os.open(\".\", 0)\n"
-        "for i in range(5000):\n    os.mkdir(\"d\", dir_fd=fd); fd = os.open(\"d\", 0, dir_fd=fd)'");
+        "for i in range(5000):\n    os.mkdir(\"d\", dir_fd=fd); fd = os.open(\"d\", 0, "
+        "dir_fd=fd)'");
     outcome deep = run(update("stage /dev/shm/deep"));
     EXPECT_EQ(deep.status, 2);
     std::string deepest = "/dev/shm/deep/zoneinfo";
     for (int level = 0; level < 16; ++level)
         deepest += "/d";
-    EXPECT_NE(deep.out.find(deepest + " lies deeper than 16 levels"), std::string::npos) << deep.out;
+    EXPECT_NE(deep.out.find(deepest + " lies deeper than 16 levels"), std::string::npos)
+        << deep.out;
     run("cd /dev/shm/race/zoneinfo/Europe && { while :; do ln -s /etc/shadow P; mv -T P Paris; "
         "cp ../America/Los_Angeles P; mv -T P Paris; done & echo $! >/dev/shm/writer; }");
     int staged = 0;
     for (int round = 0; round < 100; ++round)
-        staged += run(update("stage /dev/shm/race --as 2025b.1." + std::to_string(round))).status == 0;
+        staged +=
+            run(update("stage /dev/shm/race --as 2025b.1." + std::to_string(round))).status == 0;
     run("kill $(cat /dev/shm/writer)");
     EXPECT_EQ(run("find /var/db/timezone/tz -type l").out, "") << "a link out of the update staged";
     EXPECT_GT(staged, 0);

@@ -47,8 +47,9 @@ examine_version(const std::string& name, const std::string& version, const std::
     velm_version_match match = velm_version_match_text(version);
     if (match.size != 5)
         add(found, "error", "source-not-a-version", name,
-            "\"" + version + "\" is not a version as the boot reads them (such as 2025b.1.0): "
-                             "no boot would adopt it.",
+            "\"" + version +
+                "\" is not a version as the boot reads them (such as 2025b.1.0): "
+                "no boot would adopt it.",
             "--as with a version, such as 2025b.1.0");
     else if (version.size() > longest_version)
         add(found, "error", "source-not-a-version", name,
@@ -209,8 +210,8 @@ judgement_text(const velm_judgement& j, const std::string& name)
         out += "Next boot\n" + text_run(j.next_boot);
     out += j.problems.empty() ? "Problems: none.\n" : "Problems\n";
     for (const velm_problem& p : j.problems)
-        out += "  " + p.severity + " " + p.id + ": " + shown(p.message) + "\n    Needs: " +
-               shown(p.manual) + ".\n";
+        out += "  " + p.severity + " " + p.id + ": " + shown(p.message) +
+               "\n    Needs: " + shown(p.manual) + ".\n";
     if (j.after)
         out += "The boot after\n" + text_run(*j.after);
     return out;
@@ -221,13 +222,14 @@ judgement_json(const velm_judgement& j, const std::string& name)
 {
     std::string problems;
     for (const velm_problem& p : j.problems)
-        problems += std::string(problems.empty() ? "" : ",") + "{\"id\":" + json_text(p.id) +
-                    ",\"severity\":" + json_text(p.severity) + ",\"subject\":" +
-                    json_text(p.subject) + ",\"message\":" + json_text(p.message) +
-                    ",\"manual\":" + json_text(p.manual) + "}";
+        problems +=
+            std::string(problems.empty() ? "" : ",") + "{\"id\":" + json_text(p.id) +
+            ",\"severity\":" + json_text(p.severity) + ",\"subject\":" + json_text(p.subject) +
+            ",\"message\":" + json_text(p.message) + ",\"manual\":" + json_text(p.manual) + "}";
     return "{\"source\":" + json_text(name) + ",\"version\":" + json_text(j.version) +
-           ",\"adopts\":" + (j.adopts ? "true" : "false") + ",\"verdict\":" +
-           std::to_string(j.verdict) + ",\"next_boot\":" +
-           (j.next_boot.action.empty() ? "null" : json_run(j.next_boot)) + ",\"problems\":[" +
-           problems + "],\"after\":" + (j.after ? json_run(*j.after) : "null") + "}\n";
+           ",\"adopts\":" + (j.adopts ? "true" : "false") +
+           ",\"verdict\":" + std::to_string(j.verdict) +
+           ",\"next_boot\":" + (j.next_boot.action.empty() ? "null" : json_run(j.next_boot)) +
+           ",\"problems\":[" + problems + "],\"after\":" + (j.after ? json_run(*j.after) : "null") +
+           "}\n";
 }

@@ -35,7 +35,8 @@ open_lock(int links)
 int
 take_lock(const velm_device& device, int links, int seconds, bool clear)
 {
-    std::string path = shown(device.named(velm_path::link_directory + std::string("/") + lock_name));
+    std::string path =
+        shown(device.named(velm_path::link_directory + std::string("/") + lock_name));
     int fd = open_lock(links);
     if (fd < 0 && clear && (errno == ELOOP || errno == EEXIST || errno == EISDIR)) {
         if (int error = remove_all(links, lock_name); error != 0)
@@ -61,8 +62,8 @@ take_lock(const velm_device& device, int links, int seconds, bool clear)
         }
         if (tenths >= seconds * 10) {
             struct flock holder = lock;
-            bool known = fcntl(fd, F_GETLK, &holder) == 0 && holder.l_type != F_UNLCK &&
-                         holder.l_pid > 0;
+            bool known =
+                fcntl(fd, F_GETLK, &holder) == 0 && holder.l_type != F_UNLCK && holder.l_pid > 0;
             if (known)
                 warnx("%s is held by process %ld: gave up after %d s", path.c_str(),
                       static_cast<long>(holder.l_pid), seconds);

@@ -40,8 +40,8 @@ static const char help[] =
     "DIR unreadable, 74 a change failed, 75 locked. See tzlinks-update(8).\n";
 
 static const option options[] = {valued("as"),   flag("json"),    flag("force"),
-                                  valued("wait"), valued("root"),  flag("dry-run"),
-                                  flag("help"),   flag("version"), {}};
+                                 valued("wait"), valued("root"),  flag("dry-run"),
+                                 flag("help"),   flag("version"), {}};
 // The commands, and the options each takes.
 static const char* const commands[][2] = {
     {"check", " as json root "},
@@ -61,8 +61,9 @@ check_options(const std::string& command, const std::map<std::string, std::strin
                 return usage_error(usage, ("not an option of " + command).c_str(), "--" + option);
         }
         auto wait = given.find("wait");
-        if (wait != given.end() && (wait->second.size() > 5 ||
-                                    wait->second.find_first_not_of("0123456789") != std::string::npos))
+        if (wait != given.end() &&
+            (wait->second.size() > 5 ||
+             wait->second.find_first_not_of("0123456789") != std::string::npos))
             return usage_error(usage, "not a number of seconds", wait->second);
         return 0;
     }
@@ -108,7 +109,8 @@ below(int fd, int top)
     int at = openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     bool inside = false;
     for (int steps = 0; at >= 0 && !inside && steps < 4096 && fstat(top, &target) == 0; ++steps) {
-        int parent = fstat(at, &st) == 0 ? openat(at, "..", O_RDONLY | O_DIRECTORY | O_CLOEXEC) : -1;
+        int parent =
+            fstat(at, &st) == 0 ? openat(at, "..", O_RDONLY | O_DIRECTORY | O_CLOEXEC) : -1;
         inside = st.st_dev == target.st_dev && st.st_ino == target.st_ino;
         (void)close(at);
         at = parent;
@@ -130,7 +132,8 @@ run(const std::string& command, const std::string& source,
         status != 0)
         return status;
     int src = -1;
-    if (command != "prune" && (src = open(source.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) < 0) {
+    if (command != "prune" &&
+        (src = open(source.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) < 0) {
         warn("cannot read %s", shown(source).c_str());
         return EX_NOINPUT;
     }
@@ -148,8 +151,7 @@ run(const std::string& command, const std::string& source,
     // it, would be copied into itself.
     if (src >= 0 && (below(src, links) || below(links, src))) {
         warnx("%s and %s lie one inside the other: an update comes from outside the device",
-              shown(source).c_str(),
-              shown(device.named(velm_path::link_directory)).c_str());
+              shown(source).c_str(), shown(device.named(velm_path::link_directory)).c_str());
         return refused;
     }
     if (command == "check")

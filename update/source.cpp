@@ -116,12 +116,12 @@ walker::entry(int from, int to, const std::string& at, const std::string& child,
     if (S_ISDIR(st.st_mode) && depth >= deepest)
         return unsafe(path, "lies deeper than " + std::to_string(deepest) + " levels");
     if (S_ISREG(st.st_mode) &&
-        (st.st_size > largest_file || (found.bytes += static_cast<unsigned long long>(
-                                           st.st_size)) > largest_update))
+        (st.st_size > largest_file ||
+         (found.bytes += static_cast<unsigned long long>(st.st_size)) > largest_update))
         return unsafe(path, "is larger than an update's file can be");
-    int in = reopen(from, child, st, S_ISDIR(st.st_mode) ? directory_flags
-                                                         : O_RDONLY | O_NOFOLLOW | O_NONBLOCK |
-                                                               O_CLOEXEC,
+    int in = reopen(from, child, st,
+                    S_ISDIR(st.st_mode) ? directory_flags
+                                        : O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC,
                     why);
     if (in < 0)
         return unsafe(path, why);
@@ -163,12 +163,12 @@ note_unsafe(velm_source& found, const std::string& name, const std::string& path
             const std::string& why)
 {
     if (found.unsafe++ < most_unsafe)
-        found.problems.push_back({"source-unsafe", "error", name + path,
-                                  name + path + " " + why +
-                                      ": an update holds only directories, regular files and "
-                                      "links that stay inside it.",
-                                  path.empty() ? "a readable " + name
-                                               : name + " without " + path.substr(1)});
+        found.problems.push_back(
+            {"source-unsafe", "error", name + path,
+             name + path + " " + why +
+                 ": an update holds only directories, regular files and "
+                 "links that stay inside it.",
+             path.empty() ? "a readable " + name : name + " without " + path.substr(1)});
 }
 
 void
@@ -198,9 +198,9 @@ std::string
 source_release(int src)
 {
     int zoneinfo = openat(src, "zoneinfo", directory_flags);
-    int fd = zoneinfo < 0 ? -1
-                          : openat(zoneinfo, "+VERSION", O_RDONLY | O_NOFOLLOW | O_NONBLOCK |
-                                                             O_CLOEXEC);
+    int fd = zoneinfo < 0
+                 ? -1
+                 : openat(zoneinfo, "+VERSION", O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
     struct stat st;
     std::string word;
     if (fd >= 0 && fstat(fd, &st) == 0 && S_ISREG(st.st_mode))

@@ -60,7 +60,8 @@ clear_leftovers(const velm_device& device, int links, int updates)
         error = remove_all(links, new_link);
     if (error != 0) {
         errno = error;
-        warn("cannot clear what a cut stage left in %s", shown(device.named(velm_path::updates)).c_str());
+        warn("cannot clear what a cut stage left in %s",
+             shown(device.named(velm_path::updates)).c_str());
     }
     return error;
 }

@@ -47,7 +47,9 @@ same_entry(int a, int b, const std::string& name)
     }
     int flags = S_ISDIR(x.st_mode) ? directory_flags : O_RDONLY | O_NOFOLLOW | O_CLOEXEC;
     int fa = openat(a, name.c_str(), flags), fb = openat(b, name.c_str(), flags);
-    int same = fa < 0 || fb < 0 ? -1 : S_ISDIR(x.st_mode) ? same_content(fa, fb) : same_file(fa, fb);
+    int same = fa < 0 || fb < 0     ? -1
+               : S_ISDIR(x.st_mode) ? same_content(fa, fb)
+                                    : same_file(fa, fb);
     int error = errno;
     for (int fd : {fa, fb}) {
         if (fd >= 0)
