@@ -414,6 +414,31 @@ latest_not_understood(finder& f, const velm_entry& entry)
     found.tries = with_moves(f, found.tries);
 }
 
+// tz_latest names a directory whose name is no version: the same update
+// spelled as the boot reads it, or renamed for the release it holds.
+void
+latest_not_a_version(finder& f, const velm_commands& respelled)
+{
+    const velm_report& r = f.r;
+    const velm_dataset_facts& latest = r.latest;
+    velm_simulation& tree = f.now();
+    velm_finding& found =
+        f.add("warning", "latest-not-a-version", latest.root,
+              "tz_latest names " + latest.version +
+                  ", a name that is not a version (such as 2025b.1.0): no boot adopts it.");
+    std::string word = velm_first_word(tree, latest.root + "/zoneinfo/+VERSION");
+    std::string version = velm_release_version(word.empty() ? "2025b" : word);
+    std::string renamed = velm_path::updates + version;
+    found.manual = "a version as the name of " + latest.root + ", such as " + version;
+    if (!respelled.empty())
+        found.tries.push_back(respelled);
+    if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
+        kind(tree, renamed) == velm_entry::absent)
+        found.tries.push_back({{velm_command::move_tree, latest.root, renamed},
+                               ln(renamed, velm_path::latest_link)});
+    found.tries = with_moves(f, found.tries);
+}
+
 // An update refused by the next boot, or adopted and set aside by the one
 // after: why, in the boot's terms or the tree's.
 void
@@ -444,20 +469,7 @@ latest_refused(finder& f, const velm_refusal& refusal)
               "tz_latest names " + latest.root + ", which does not exist: no boot adopts it.")
             .tries = with_moves(f, with_prune({to_live, unlink}));
     } else if (!latest.version_understood) {
-        velm_finding& found =
-            f.add("warning", "latest-not-a-version", latest.root,
-                  name + ", a name that is not a version (such as 2025b.1.0): no boot adopts it.");
-        std::string word = velm_first_word(tree, latest.root + "/zoneinfo/+VERSION");
-        std::string version = velm_release_version(word.empty() ? "2025b" : word);
-        std::string renamed = velm_path::updates + version;
-        found.manual = "a version as the name of " + latest.root + ", such as " + version;
-        if (!respelled.empty())
-            found.tries.push_back(respelled);
-        if (velm_version_match_text(word).size == 5 && latest.root != r.live.root &&
-            kind(tree, renamed) == velm_entry::absent)
-            found.tries.push_back({{velm_command::move_tree, latest.root, renamed},
-                                   ln(renamed, velm_path::latest_link)});
-        found.tries = with_moves(f, found.tries);
+        latest_not_a_version(f, respelled);
     } else {
         velm_finding& found =
             f.add("warning", refusal.id.c_str(), latest.root,
