@@ -35,6 +35,9 @@ outcome run(const std::string& command);
 // programs without the capabilities drop names (setpriv's list), if any.
 std::string program(const std::string& path, const std::string& args = "");
 void drop_capabilities(const std::string& drop);
+// What puts tzlinks-update on PATH, as the repairs' commands call it,
+// through $TZLINKS_RUNNER.
+std::string update_on_path();
 // The same for tzlinks, under strace failing calls as inject says (its
 // inject= expression) or writing its trace to a file when either is not
 // empty; leak checks cannot run under ptrace.

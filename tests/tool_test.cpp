@@ -113,9 +113,7 @@ TEST_P(tool, row)
     run("rm -rf /var/* /usr/share/* /etc/localtime && cd " + copy +
         " && cp -a var/. /var && cp -a usr/share/. /usr/share && cp -a etc/. /etc");
     std::ofstream(copy + ".sh") << run(program(TZLINKS_STATUS_BINARY, "--commands")).out;
-    EXPECT_EQ(
-        run("PATH=$(dirname " TZLINKS_UPDATE_BINARY "):$PATH exec sh -e " + copy + ".sh").status,
-        0);
+    EXPECT_EQ(run(update_on_path() + "exec sh -e " + copy + ".sh").status, 0);
     run(tzlinks());
     json repaired = status_report();
     EXPECT_EQ(json({{"health", repaired["health"]}, {"findings", ids(repaired)}}),
@@ -412,8 +410,7 @@ TEST(status, field_cases)
         outcome shown = run(program(TZLINKS_STATUS_BINARY, "--commands"));
         std::string expected = run("tz=/var/db/timezone; printf '%s' \"" + commands + "\"").out;
         EXPECT_EQ(std::regex_replace(shown.out, std::regex("\n"), "; "), expected) << tree;
-        run("PATH=$(dirname " TZLINKS_UPDATE_BINARY "):$PATH sh -e -c '" + shown.out + "' && " +
-            tzlinks().substr(5));
+        run(update_on_path() + "sh -e -c '" + shown.out + "' && " + tzlinks().substr(5));
         json repaired = status_report();
         EXPECT_EQ(repaired["zoneinfo"].get<std::string>() + " " +
                       repaired["localtime_zone"].get<std::string>() + " " +
@@ -460,8 +457,8 @@ TEST_P(compose, trees)
                                 (finding["severity"] == "note" ? finding["message"] : json(""))
                                     .get<std::string>());
         }
-        outcome repair = run("PATH=$(dirname " TZLINKS_UPDATE_BINARY "):$PATH sh -e -c '" + script +
-                             "' && " + tzlinks().substr(5));
+        outcome repair =
+            run(update_on_path() + "sh -e -c '" + script + "' && " + tzlinks().substr(5));
         repaired = status_report();
         // Back, though the commands were to clear it; or still to repair.
         std::vector<std::string> left;
