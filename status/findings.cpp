@@ -596,18 +596,20 @@ find_incomplete(finder& f, const std::string& root)
     std::string data = velm_icu_file(tree, root + "/icutz");
     bool kept = update_of(r.next_boot.zoneinfo) == root && r.after_next &&
                 update_of(r.after_next->zoneinfo) == root;
+    // Not yet in use: tz_latest back at the data in use, and the update
+    // pruned; in use: a roll back, among the moves to other data.
+    bool in_use = update_of(r.zoneinfo) == root;
+    velm_commands back = r.live.present && !r.live.root.empty() && !in_use
+                             ? velm_commands{ln(r.live.root, velm_path::latest_link)}
+                             : velm_commands{rm(velm_path::latest_link)};
     if (kept && (!zoneinfo || data.empty()))
         f.add("error", "update-incomplete", root,
               root + ", which every boot keeps, has " +
                   (!zoneinfo ? "no tz database (zoneinfo/)" : "no ICU data the boot can use") +
                   ": it was copied in part.")
-            .tries = with_moves(f, {});
+            .tries = with_moves(f, with_prune({back}));
     if (!zoneinfo || r.zone.empty() || velm_zone_file(tree, root + "/zoneinfo/" + r.zone))
         return;
-    bool in_use = update_of(r.zoneinfo) == root;
-    velm_commands back = r.live.present && !r.live.root.empty() && !in_use
-                             ? velm_commands{ln(r.live.root, velm_path::latest_link)}
-                             : velm_commands{rm(velm_path::latest_link)};
     f.add(
          "warning", "update-lacks-zone", root,
          root + "/zoneinfo lacks " + r.zone + ", the device's zone: " +
@@ -732,13 +734,17 @@ find_next_boot(finder& f)
             found.tries = {{}}, found.manual = "the repairs of the findings above";
         return;
     }
+    // Back to the data in use, which the next boot would leave.
+    velm_commands back = {rm(velm_path::latest_link)};
+    if (r.live.present && !r.live.root.empty())
+        back = {ln(r.live.root, velm_path::latest_link)};
     velm_simulation& tree = f.next();
     bool usable_now = kind(f.now(), velm_path::zoneinfo_link, true) == velm_entry::directory;
     if (usable_now && kind(f.next(), velm_path::zoneinfo_link, true) != velm_entry::directory)
         f.add("error", "next-boot-unusable", velm_path::zoneinfo_link,
               "The next boot links zoneinfo to " + quoted(next.zoneinfo) +
                   ", where there is no tz database: programs would fall back to UTC.")
-            .tries = with_moves(f, {{rm(velm_path::latest_link)}, system});
+            .tries = with_moves(f, with_prune({back, {rm(velm_path::latest_link)}, system}));
     find_icutz(f);
     (void)tree;
 }

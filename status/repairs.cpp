@@ -156,10 +156,14 @@ check_repairs(velm_simulation& tree, velm_report& r)
             const std::optional<velm_report>& alone = outcomes.of({});
             finding.by_earlier = !alone || !cleared(r, {&finding}, *alone);
         }
-        // None that works, and nothing to supply: a fault of this program,
-        // shown as such.
-        if (!finding.commands && finding.manual.empty() && !finding.tries.empty())
-            finding.commands = finding.tries.front();
+        // None that works: what it needs is what a finding above needs, when
+        // nothing is to run; else a fault of this program, shown as such.
+        if (!finding.commands && finding.manual.empty() && !finding.tries.empty()) {
+            if (finding.tries.front().empty())
+                finding.manual = "the repairs of the findings above";
+            else
+                finding.commands = finding.tries.front();
+        }
         if (finding.commands)
             finding.manual.clear();
         if (finding.verified)

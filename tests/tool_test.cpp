@@ -203,6 +203,13 @@ TEST(status, command_line)
                   program(TZLINKS_STATUS_BINARY) + "'")
                   .out.find("note unverified: tzlinks-status runs as user 1000, not as root"),
               std::string::npos);
+    // Nothing any command can repair: an empty script says so.
+    ASSERT_TRUE(build_tree("rm $tz/tz_latest; mv /usr/share/zoneinfo.default /usr/share/z"));
+    outcome needs = run(program(TZLINKS_STATUS_BINARY, "--commands"));
+    EXPECT_EQ(std::to_string(needs.status) + needs.out + needs.err,
+              "0tzlinks-status: no command to run: 3 findings need what only a person can supply "
+              "(see \"Needs:\" in the report)\n");
+    ASSERT_TRUE(build_tree("mv /usr/share/z /usr/share/zoneinfo.default"));
     outcome full = run(program(TZLINKS_STATUS_BINARY, ">/dev/full"));
     EXPECT_EQ(std::to_string(full.status) + full.err,
               "74tzlinks-status: cannot write the report: No space left on device\n");
@@ -373,6 +380,9 @@ const std::tuple<std::string, std::string, std::string> field_cases[] = {
      back + "tzlinks-update prune; ", at_2024a},
     {old + "live_update 2025a.1.0; latest 2025a.1.0; rm $tz/tz/2025a.1.0/zoneinfo/Europe/Paris",
      roll, at_2024a},
+    {"live_update 2024a.1.0; update_dataset 2025a.1.0 44l; latest 2025a.1.0; rm -r "
+     "$tz/tz/2025a.1.0/zoneinfo",
+     back + "tzlinks-update prune; ", at_2024a},
     // Another ICU schema, or none: tz_latest back at the data in use.
     {"live_update 2024a.1.0; update_dataset 2025a.1.0 46l; latest 2025a.1.0",
      back + "tzlinks-update prune; ", at_2024a},
