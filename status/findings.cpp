@@ -313,11 +313,11 @@ data_moves(finder& f)
                 for (const velm_command& command : relink(live, velm_path::localtime_link))
                     moves.back().push_back(command);
             // icutz still names the update left, until the boot relinks it.
-            if (variant % 2 == 1)
+            if (variant % 2 == 1) {
                 for (const velm_command& command : clear(velm_path::icutz_link))
                     moves.back().push_back(command);
-            if (variant % 2 == 1)
                 moves.back().push_back({velm_command::prune, "", ""});
+            }
         }
     }
     return moves;
