@@ -18,11 +18,9 @@
 #include <err.h>
 #include <sysexits.h>
 
-namespace {
-
-// A name of tz/ that stage can still make its staging directory from:
-// ".stage-V.xxxxxxxx" within NAME_MAX.
 const size_t longest_version = 255 - sizeof ".stage-" - 9 + 1;
+
+namespace {
 
 // The zone the device's localtime names in the live tree; "" for none.
 std::string

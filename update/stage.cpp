@@ -35,7 +35,9 @@ staging_directory(int updates, const std::string& version)
             break;
         char suffix[16];
         (void)snprintf(suffix, sizeof suffix, ".%08x", random);
-        std::string name = ".stage-" + version + suffix;
+        // Cut, so that a version too long to stage is refused by check
+        // like every other unusable name, not by mkdir.
+        std::string name = ".stage-" + version.substr(0, longest_version) + suffix;
         if (mkdirat(updates, name.c_str(), 0700) == 0)
             return name;
         if (errno != EEXIST)

@@ -56,6 +56,10 @@ struct velm_judgement {
     int error = 0;      // and why: nothing is judged on it
 };
 
+// The longest version stage can make its staging directory from,
+// ".stage-V.xxxxxxxx", within NAME_MAX; a longer one is refused.
+extern const size_t longest_version;
+
 // Judges the update below fd (SRC, or its staged copy) as version.
 velm_judgement judge(const velm_device& device, int fd, const velm_source& walked,
                      const std::string& name, const std::string& version);
