@@ -7,13 +7,10 @@
 // error that was not there, and the same command run again must complete.
 #include "harness.h"
 
-#include <fstream>
 #include <gtest/gtest.h>
 #include <iostream>
 #include <nlohmann/json.hpp>
-#include <numeric>
 #include <regex>
-#include <unistd.h>
 
 namespace {
 
@@ -130,16 +127,8 @@ TEST_P(update_tool, row)
     outcome o = run(update(r.args));
     std::string done = state();
     std::string got = "exit=" + std::to_string(o.status);
-    if (r.expect.find("problems=") != std::string::npos) {
-        std::vector<std::string> ids;
-        json judgement = json::parse(judged);
-        for (const json& problem : judgement["problems"])
-            ids.push_back(problem["id"]);
-        got += " problems=" + std::accumulate(ids.begin(), ids.end(), std::string(),
-                                              [](const std::string& a, const std::string& b) {
-                                                  return a.empty() ? b : a + "," + b;
-                                              });
-    }
+    if (r.expect.find("problems=") != std::string::npos)
+        got += " problems=" + joined(ids(json::parse(judged), "problems"));
     if (r.expect.find("latest=") != std::string::npos)
         got += " " + (r.expect.find(" tz=") != std::string::npos ? done : latest_of(done));
     EXPECT_EQ(got, r.expect) << o.out << o.err;
@@ -157,13 +146,10 @@ TEST_P(update_tool, row)
         // The boot then does what check foretold.
         outcome boot = run(tzlinks());
         json now = json::parse(run(program(TZLINKS_STATUS_BINARY, "--json")).out),
-             foretold = json::parse(judged)["next_boot"];
+             foretold = json::parse(judged)["next_boot"], &said = foretold["messages"];
         EXPECT_EQ(json({now["zoneinfo"], now["icutz"], now["localtime"], boot.err}),
                   json({foretold["zoneinfo"], foretold["icutz"], foretold["localtime"],
-                        std::accumulate(foretold["messages"].begin(), foretold["messages"].end(),
-                                        std::string(), [](const std::string& a, const json& m) {
-                                            return a + m.get<std::string>() + "\n";
-                                        })}));
+                        joined(said, "\n") + (said.empty() ? "" : "\n")}));
     }
     if (faults && (checking || o.status == 0))
         try_update_faults(r.args, pristine, done, o.out);
@@ -205,7 +191,7 @@ TEST(update, command_line)
         {"prune --dry", "64 tzlinks-update: unknown argument: --dry\n"},
         {"check /var/tmp/src --force", "64 tzlinks-update: not an option of check: --force\n"},
         {"check /var/tmp/src extra", "64 tzlinks-update: unknown argument: extra\n"},
-        {"--version", "0 "},
+        {"--help", "0 usage: tzlinks-update check SRC [--as V] [--json] [--root DIR]\n"},
         {"stage /var/tmp/src --wait 1", "75 tzlinks-update: /var/db/timezone/.tzlinks-update.lock "
                                         "is held by process " +
                                             holder.substr(0, holder.size() - 1) +
@@ -213,14 +199,21 @@ TEST(update, command_line)
     };
     for (const auto& [args, expected] : uses) {
         outcome o = run(update(args));
-        EXPECT_EQ(std::to_string(o.status) + " " + o.err.substr(0, o.err.find('\n') + 1), expected)
+        std::string said = o.err + o.out;
+        EXPECT_EQ(std::to_string(o.status) + " " + said.substr(0, said.find('\n') + 1), expected)
             << args;
     }
     EXPECT_EQ(run(update("stage /var/tmp/src --wait 5")).status, 0) << "once the first let go";
-    // Names are shown escaped.
-    run("mkdir \"/var/db/timezone/tz/x$(printf '\\033[31m\\342\\200\\256\\nz')\"");
-    EXPECT_EQ(run(update("prune")).out,
-              "Removed /var/db/timezone/tz/x\\x1b[31m\\xe2\\x80\\xae\\x0az\n");
+    // Names are shown escaped; what is no directory is left.
+    run("mkdir \"/var/db/timezone/tz/x$(printf '\\033[31m\\342\\200\\256\\342\\201\\251\\nz')\"; "
+        "touch /var/db/timezone/tz/notes");
+    std::string pruned = run(update("prune")).out;
+    EXPECT_NE(
+        pruned.find("Removed /var/db/timezone/tz/x\\x1b[31m\\xe2\\x80\\xae\\xe2\\x81\\xa9\\x0az\n"),
+        std::string::npos)
+        << pruned;
+    EXPECT_NE(pruned.find("Left /var/db/timezone/tz/notes: it is no directory\n"),
+              std::string::npos);
     // A file system mounted inside an update no link names is left as it
     // is, and named; a full one is said to be full.
     run("mkdir -p /var/db/timezone/tz/old/zoneinfo && mount -t tmpfs m "
@@ -253,10 +246,9 @@ TEST(update, hostile_sources)
         "dir_fd=fd)'");
     outcome deep = run(update("stage /dev/shm/deep"));
     EXPECT_EQ(deep.status, 2);
-    std::string deepest = "/dev/shm/deep/zoneinfo";
-    for (int level = 0; level < 16; ++level)
-        deepest += "/d";
-    EXPECT_NE(deep.out.find(deepest + " lies deeper than 16 levels"), std::string::npos)
+    std::string deepest = std::regex_replace(std::string(16, 'd'), std::regex("d"), "/d");
+    EXPECT_NE(deep.out.find("/dev/shm/deep/zoneinfo" + deepest + " lies deeper than 16 levels"),
+              std::string::npos)
         << deep.out;
     run("cd /dev/shm/race/zoneinfo/Europe && { while :; do ln -s /etc/shadow P; mv -T P Paris; "
         "cp ../America/Los_Angeles P; mv -T P Paris; done & echo $! >/dev/shm/writer; }");
