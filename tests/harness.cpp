@@ -129,12 +129,21 @@ schema_breaks(const std::vector<std::string>& reports)
 }
 
 std::vector<std::string>
-ids(const nlohmann::json& report)
+ids(const nlohmann::json& report, const char* list)
 {
     std::vector<std::string> found;
-    for (const nlohmann::json& finding : report["findings"])
+    for (const nlohmann::json& finding : report[list])
         found.push_back(finding["id"]);
     return found;
+}
+
+std::string
+joined(const nlohmann::json& texts, const std::string& between)
+{
+    std::string out;
+    for (const nlohmann::json& text : texts)
+        out += (out.empty() ? "" : between) + text.get<std::string>();
+    return out;
 }
 
 std::map<std::string, std::string>
@@ -228,12 +237,6 @@ set_up(const row& r)
 {
     drop_capabilities(r.caps);
     return fresh_tree() && build_tree("system_dataset 2023c 44l; etc_localtime\n" + r.tree);
-}
-
-void
-PrintTo(const row& r, std::ostream* out)
-{
-    *out << r.name;
 }
 
 std::vector<row>

@@ -49,7 +49,9 @@ std::string tzlinks(const std::string& inject = "", const std::string& trace = "
 std::string schema_breaks(const std::vector<std::string>& reports);
 
 // The ids of a report's findings, in order.
-std::vector<std::string> ids(const nlohmann::json& report);
+std::vector<std::string> ids(const nlohmann::json& report, const char* list = "findings");
+// The texts of a JSON array joined.
+std::string joined(const nlohmann::json& texts, const std::string& between = ",");
 
 // Every entry below /var and /usr/share, by path: "->target" for a link,
 // "=content" for a file, "/" for a directory, "|" for anything else; with
@@ -64,8 +66,6 @@ struct row {
     bool local = false;  // a tree no copy can stand for (its mounts)
     bool faults = false; // run in the fault and power-cut mode too
 };
-// A failing row is named by its name.
-void PrintTo(const row& r, std::ostream* out);
 // A row's device: a fresh tree with the system data 2023c, /etc/localtime
 // through the boot's link, and what the row builds; its capabilities set.
 bool set_up(const row& r);
